@@ -35,3 +35,21 @@ void VETAJ_DeleteDecoderInfo(DecoderInfo* d) {
   }
   vj::fake_free(d->marker);
 }
+
+void vj_setup_component_geometry(DecoderInfo* d) {
+  const uint32_t W = d->image_width;
+  const uint32_t H = d->image_height;
+  const uint32_t mh = d->max_h_samp != 0 ? d->max_h_samp : 1;
+  const uint32_t mv = d->max_v_samp != 0 ? d->max_v_samp : 1;
+  const uint32_t n = d->scale_num != 0 ? d->scale_num : 1;
+  const uint32_t r = d->scale_shift;
+  for (uint32_t i = 0; i < d->num_components; ++i) {
+    ComponentInfo* c = &d->components[i];
+    c->width_blocks = (W * c->h_samp + 8 * mh - 1) / (8 * mh);
+    c->height_blocks = (H * c->v_samp + 8 * mv - 1) / (8 * mv);
+    c->width_samples = static_cast<uint16_t>((W * c->h_samp + mh - 1) / mh);
+    c->height_samples = static_cast<uint16_t>((H * c->v_samp + mv - 1) / mv);
+    c->output_width = static_cast<int32_t>((n * c->width_samples + (1u << r) - 1) >> r);
+  }
+  d->mcu_rows = (H + 8 * mv - 1) / (8 * mv);
+}

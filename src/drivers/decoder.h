@@ -177,4 +177,9 @@ void VETAJ_DeleteDecoderInfo(DecoderInfo* decoder);
 // when memory runs out.
 bool vj_register_derived_table(DecoderInfo* decoder, DerivedHuffTable* table);
 
+// Fills each component's block and sample geometry from the frame header:
+// blocks across and down, sampled width and height, reduced sampled width,
+// and the MCU rows of the frame.
+void vj_setup_component_geometry(DecoderInfo* decoder);
+
 #endif  // VETAJ_DRIVERS_DECODER_H

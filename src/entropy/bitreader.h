@@ -1,0 +1,252 @@
+// The bit reader of the entropy decoders.
+//
+// Bits arrive most significant first into a 32-bit buffer whose low
+// `bits` bits are valid. Bytes are appended one at a time: a 0xFF followed by
+// 0x00 is a data byte 0xFF; 0xFF followed by anything else is a marker,
+// after which the decoder reads zero bits (and notes that it had to).
+//
+// Two byte-fetch policies share every decoding routine:
+// - CarefulFetch follows the refill rule exactly: it refills the window from
+//   the input when the cursor runs out, records a marker it meets, and
+//   supplies zero bits after it.
+// - FastFetch is used only when the window is known to hold every byte one
+//   MCU can possibly need, so it never tests for the end of the window. It
+//   takes two bytes per refill. When it meets a marker it supplies zeros and
+//   reports it; the caller then decodes that MCU again with CarefulFetch, so
+//   both policies always produce the same result.
+#ifndef VETAJ_ENTROPY_BITREADER_H
+#define VETAJ_ENTROPY_BITREADER_H
+
+#include <cstdint>
+
+#include "drivers/decoder.h"
+
+namespace vj {
+
+// Bytes one block can take at most, with every byte stuffed: 64 symbols of at
+// most 32 bits (17-bit corrupt code + 15 magnitude bits), doubled.
+constexpr uint32_t kMaxBlockBytes = 512;
+// Bytes the fast policy may look at beyond what it consumes.
+constexpr uint32_t kFetchSlack = 16;
+
+inline uint32_t fast_margin(uint32_t blocks) { return blocks * kMaxBlockBytes + kFetchSlack; }
+
+// Test knob: when true every MCU is decoded with the careful policy.
+extern bool g_entropy_careful_only;
+
+// Refills the entropy cursor so that at least `want` bytes are in the
+// window when the input has them. Memory inputs extend the window in place;
+// other inputs move the unread bytes to the start of the window buffer and
+// read behind them. Returns the bytes now available.
+uint32_t entropy_top_up(DecoderInfo* d, uint32_t want);
+
+// Shift left that yields 0 for counts of 32 or more.
+inline uint32_t shl(uint32_t v, int32_t n) { return n >= 32 ? 0u : v << n; }
+
+struct BitState {
+  uint32_t buf;
+  int32_t bits;
+  const uint8_t* cur;
+  uint32_t avail;
+};
+
+struct FastFetch;
+struct CarefulFetch;
+
+// The working registers of one MCU. Fetch is FastFetch or CarefulFetch.
+template <class Fetch>
+struct BitReader {
+  uint32_t buf;
+  int32_t bits;
+  const uint8_t* cur;
+  uint32_t avail;
+  DecoderInfo* d;
+  EntropyState* e;
+  uint8_t insufficient;
+  bool marker_seen = false;  // FastFetch: a marker was met
+  bool eof_as_marker = false; // CarefulFetch: end of input reads as zero bits
+
+  explicit BitReader(DecoderInfo* dec)
+      : buf(dec->entropy->bit_buffer),
+        bits(dec->entropy->bits_left),
+        cur(dec->window->window),
+        avail(dec->window->remaining),
+        d(dec),
+        e(dec->entropy),
+        insufficient(dec->entropy->insufficient) {}
+
+  void store() const {
+    e->bit_buffer = buf;
+    e->bits_left = bits;
+    e->insufficient = insufficient;
+    d->window->window = const_cast<uint8_t*>(cur);
+    d->window->remaining = avail;
+  }
+
+  // Ensures at least n valid bits (n <= 25). False when the input ended.
+  bool ensure(int32_t n) { return Fetch::ensure(*this, n); }
+  // Ensures 8 bits for a lookahead if the data has them (no zero fill).
+  void prefetch8() { Fetch::prefetch8(*this); }
+
+  uint32_t peek(int32_t n) const { return (buf >> (bits - n)) & ((1u << n) - 1u); }
+  uint32_t take(int32_t n) {
+    bits -= n;
+    return (buf >> bits) & ((1u << n) - 1u);
+  }
+
+  // One bit, for the bit-by-bit code search.
+  bool bit(uint32_t* out) {
+    if (bits < 1 && !ensure(1)) return false;
+    *out = take(1);
+    return true;
+  }
+
+  // Code search from length `l`, with the first l bits already in `code`.
+  // A code longer than 16 bits decodes as symbol 0. Returns -1 when the
+  // input ended.
+  int32_t slow_decode(const DerivedHuffTable* t, int32_t l, uint32_t code) {
+    while (l <= 16 && static_cast<int32_t>(code) > t->maxcode[l]) {
+      uint32_t b;
+      if (!bit(&b)) return -1;
+      code = (code << 1) | b;
+      ++l;
+    }
+    if (l > 16) return 0;
+    return t->source->huffval[static_cast<uint32_t>(static_cast<int32_t>(code) + t->valoffset[l]) & 255u];
+  }
+
+  // Decodes one Huffman symbol; -1 when the input ended.
+  int32_t decode(const DerivedHuffTable* t) {
+    prefetch8();
+    if (bits >= 8) {
+      const uint32_t entry = t->lookahead[peek(8)];
+      const int32_t len = static_cast<int32_t>(entry >> 8);
+      if (len <= 8) {
+        bits -= len;
+        return static_cast<int32_t>(entry & 0xFF);
+      }
+      if (!ensure(17)) {
+        if (!ensure(9)) return -1;
+      }
+      return slow_decode(t, 9, take(9));
+    }
+    // Fewer than 8 bits exist before a marker or the end of the input.
+    uint32_t b;
+    if (!bit(&b)) return -1;
+    return slow_decode(t, 1, b);
+  }
+
+  // Reads s magnitude bits and extends them to a signed value.
+  bool receive(int32_t s, int32_t* value) {
+    if (bits < s && !ensure(s)) return false;
+    int32_t v = static_cast<int32_t>(take(s));
+    if (v < VETAJ_HUFF_EXTEND_TEST[s]) v += static_cast<int32_t>(1u - (1u << s));
+    *value = v;
+    return true;
+  }
+
+  // Drops s bits (magnitude bits that are not needed).
+  bool drop(int32_t s) {
+    if (bits < s && !ensure(s)) return false;
+    bits -= s;
+    return true;
+  }
+};
+
+// Window known to hold enough bytes: two bytes per refill, no end tests.
+struct FastFetch {
+  template <class R>
+  static void fill16(R& r) {
+    for (int i = 0; i < 2; ++i) {
+      uint32_t c = r.cur[0];
+      if (c == 0xFF) {
+        if (r.cur[1] == 0x00) {
+          r.cur += 2;
+          r.avail -= 2;
+        } else {
+          c = 0;  // a marker: zeros from here on, the cursor stays on it
+          r.marker_seen = true;
+        }
+      } else {
+        ++r.cur;
+        --r.avail;
+      }
+      r.buf = (r.buf << 8) | c;
+    }
+    r.bits += 16;
+  }
+  template <class R>
+  static bool ensure(R& r, int32_t n) {
+    while (r.bits < n) fill16(r);
+    return true;
+  }
+  template <class R>
+  static void prefetch8(R& r) {
+    while (r.bits < 17) fill16(r);
+  }
+};
+
+// The exact refill rule, with input refills and marker recording.
+struct CarefulFetch {
+  // Next raw byte of the input; -1 at its end.
+  template <class R>
+  static int32_t raw(R& r) {
+    if (r.avail == 0) {
+      r.d->window->window = const_cast<uint8_t*>(r.cur);
+      r.d->window->remaining = 0;
+      if (entropy_top_up(r.d, 1) == 0) return -1;
+      r.cur = r.d->window->window;
+      r.avail = r.d->window->remaining;
+    }
+    --r.avail;
+    return *r.cur++;
+  }
+  // Appends bytes while 24 or fewer bits are held and no marker is pending.
+  // Returns false when the input ended.
+  template <class R>
+  static bool append(R& r) {
+    if (r.d->unread_marker != 0) return true;
+    while (r.bits <= 24) {
+      int32_t c = raw(r);
+      if (c < 0) return false;
+      if (c == 0xFF) {
+        do {
+          c = raw(r);
+        } while (c == 0xFF);
+        if (c < 0) return false;
+        if (c != 0) {
+          r.d->unread_marker = static_cast<uint32_t>(c);
+          return true;
+        }
+        c = 0xFF;
+      }
+      r.buf = (r.buf << 8) | static_cast<uint32_t>(c);
+      r.bits += 8;
+    }
+    return true;
+  }
+  template <class R>
+  static void zero_fill(R& r) {
+    if (r.insufficient == 0) r.insufficient = 1;
+    r.buf = shl(r.buf, 25 - r.bits);
+    r.bits = 25;
+  }
+  template <class R>
+  static bool ensure(R& r, int32_t n) {
+    const bool more = append(r);
+    if (r.bits >= n) return true;
+    if (r.d->unread_marker != 0 || (!more && r.eof_as_marker)) {
+      zero_fill(r);
+      return true;
+    }
+    return false;
+  }
+  template <class R>
+  static void prefetch8(R& r) {
+    if (r.bits < 8) (void)append(r);
+  }
+};
+
+}  // namespace vj
+
+#endif  // VETAJ_ENTROPY_BITREADER_H

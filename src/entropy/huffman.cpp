@@ -1,0 +1,175 @@
+// Derived Huffman tables, AC skip tables and the constant block tables.
+#include "entropy/huffman.h"
+
+#include "drivers/decoder.h"
+
+extern "C" {
+
+// Zig-zag index -> natural (row-major) position, with 16 guard entries so
+// that a corrupt run carrying the position past 63 stays inside the block.
+const uint8_t VETAJ_NATURAL_ORDER[80] = {
+    0,  1,  8,  16, 9,  2,  3,  10, 17, 24, 32, 25, 18, 11, 4,  5,
+    12, 19, 26, 33, 40, 48, 41, 34, 27, 20, 13, 6,  7,  14, 21, 28,
+    35, 42, 49, 56, 57, 50, 43, 36, 29, 22, 15, 23, 30, 37, 44, 51,
+    58, 59, 52, 45, 38, 31, 39, 46, 53, 60, 61, 54, 47, 55, 62, 63,
+    63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63};
+
+// A magnitude value v of s bits is negative when v < entry s.
+const int32_t VETAJ_HUFF_EXTEND_TEST[16] = {
+    0,     0x1,   0x2,   0x4,   0x8,   0x10,  0x20,   0x40,
+    0x80,  0x100, 0x200, 0x400, 0x800, 0x1000, 0x2000, 0x4000};
+
+}  // extern "C"
+
+namespace {
+
+// Fills `t` from `src`. Returns false for an invalid table.
+bool build_derived(DerivedHuffTable* t, const HuffTable* src) {
+  KOLVAVETA_OsMemset(t, 0, sizeof(*t));
+  t->source = src;
+  uint8_t sizes[257];
+  uint32_t codes[257];
+  uint32_t count = 0;
+  for (int l = 1; l <= 16; ++l) {
+    for (uint32_t i = 0; i < src->bits[l]; ++i) {
+      if (count >= 256) return false;  // more than 256 symbols
+      sizes[count++] = static_cast<uint8_t>(l);
+    }
+  }
+  sizes[count] = 0;
+  // Canonical code assignment.
+  uint32_t code = 0;
+  uint32_t k = 0;
+  uint32_t si = count > 0 ? sizes[0] : 0;
+  while (k < count) {
+    while (k < count && sizes[k] == si) codes[k++] = code++;
+    if (code >= (1u << si)) return false;  // over-subscribed
+    code <<= 1;
+    ++si;
+  }
+  // maxcode / valoffset per length.
+  uint32_t p = 0;
+  for (int l = 1; l <= 16; ++l) {
+    if (src->bits[l] != 0) {
+      t->valoffset[l] = static_cast<int32_t>(p) - static_cast<int32_t>(codes[p]);
+      p += src->bits[l];
+      t->maxcode[l] = static_cast<int32_t>(codes[p - 1]);
+    } else {
+      t->maxcode[l] = -1;
+    }
+  }
+  t->maxcode[17] = 0xFFFFF;
+  // 8-bit lookahead.
+  for (uint32_t& e : t->lookahead) e = kLongCode;
+  for (uint32_t i = 0; i < count; ++i) {
+    const uint32_t l = sizes[i];
+    if (l > static_cast<uint32_t>(kLookaheadBits)) continue;
+    const uint32_t shift = kLookaheadBits - l;
+    const uint32_t first = codes[i] << shift;
+    for (uint32_t j = 0; j < (1u << shift); ++j)
+      t->lookahead[first + j] = (l << 8) | src->huffval[i];
+  }
+  return true;
+}
+
+void build_skip_table(AcSkipTable* skip, const DerivedHuffTable* t) {
+  for (uint32_t v = 0; v < 256; ++v) {
+    const uint32_t e = t->lookahead[v];
+    const uint32_t len = (e >> 8) % 9;  // a long code gives 0
+    if (len == 0) {
+      skip->entry[v] = 0;
+      continue;
+    }
+    const uint32_t r = (e >> 4) & 15;
+    const uint32_t s = e & 15;
+    uint32_t bits = len;
+    uint32_t advance;
+    bool stop;
+    if (s != 0) {
+      bits += s;
+      advance = r + 1;
+      stop = bits > 7;
+    } else if (r < 15) {
+      advance = kSkipEob;
+      stop = true;
+    } else {
+      advance = 16;
+      stop = bits > 7;
+    }
+    while (!stop && bits < 8) {
+      const uint32_t e2 = t->lookahead[(v << bits) & 255];
+      const uint32_t len2 = (e2 >> 8) % 9;
+      if (len2 == 0 || bits + len2 > 8) break;
+      bits += len2;
+      const uint32_t r2 = (e2 >> 4) & 15;
+      const uint32_t s2 = e2 & 15;
+      if (s2 != 0) {
+        advance += r2 + 1;
+        bits += s2;
+      } else {
+        advance += r2 < 15 ? kSkipEob : 16;
+      }
+      stop = advance > 63;
+    }
+    skip->entry[v] = bits | (advance << 16);
+  }
+}
+
+bool skipping_wanted(const DecoderInfo* d) {
+  if (d->scale_shift != 0 || d->region_map_flag != 0) return true;
+  const DecInfo* o = d->owner;
+  return o != nullptr && (o->region_mode != 0 || (o->options & KOLVAVETA_OPT_SKIP_TABLES) != 0);
+}
+
+int32_t prepare(DecoderInfo* d, int32_t is_dc, int32_t table_no, DerivedHuffTable** slot,
+                EntropyState* entropy, bool progressive) {
+  if (table_no < 0 || table_no > 3 || slot == nullptr) return vj::kStatusFail;
+  const HuffTable* src = is_dc ? d->dc_huff[table_no] : d->ac_huff[table_no];
+  if (src == nullptr) return vj::kStatusFail;
+  DerivedHuffTable* t = progressive ? nullptr : *slot;
+  if (t == nullptr) {
+    t = vj::alloc_zeroed<DerivedHuffTable>();
+    if (t == nullptr) return vj::kStatusFail;
+    if (!vj_register_derived_table(d, t)) {
+      KOLVAVETA_OsFree(t);
+      return vj::kStatusFail;
+    }
+    *slot = t;
+  }
+  if (!build_derived(t, src)) return vj::kStatusFail;
+  if (is_dc) {
+    uint32_t n = 0;
+    for (int l = 1; l <= 16; ++l) n += src->bits[l];
+    for (uint32_t i = 0; i < n; ++i)
+      if (src->huffval[i] > 15) return vj::kStatusFail;
+    return vj::kStatusOk;
+  }
+  // Skip tables serve baseline frames only (the progressive builder is used
+  // for progressive frames and so never makes one).
+  const bool baseline = d->marker != nullptr && d->marker->frame_kind == kFrameBaseline;
+  if (progressive || entropy == nullptr || !baseline || !skipping_wanted(d))
+    return vj::kStatusOk;
+  // The skip table follows its derived table: a table number redefined
+  // between scans gets its skip table rebuilt too.
+  AcSkipTable* skip = entropy->ac_skip[table_no];
+  if (skip == nullptr) {
+    skip = vj::alloc_zeroed<AcSkipTable>();
+    if (skip == nullptr) return vj::kStatusFail;
+    entropy->ac_skip[table_no] = skip;
+  }
+  entropy->ac_skip_copy[table_no] = skip;
+  build_skip_table(skip, t);
+  return vj::kStatusOk;
+}
+
+}  // namespace
+
+int32_t VETAJ_PrepareDerivedTbl(DecoderInfo* d, int32_t is_dc, int32_t table_no,
+                                DerivedHuffTable** slot, EntropyState* entropy) {
+  return prepare(d, is_dc, table_no, slot, entropy, false);
+}
+
+int32_t VETAJ_P_PrepareDerivedTbl(DecoderInfo* d, int32_t is_dc, int32_t table_no,
+                                  DerivedHuffTable** slot, EntropyState* entropy) {
+  return prepare(d, is_dc, table_no, slot, entropy, true);
+}

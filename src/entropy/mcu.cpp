@@ -1,0 +1,413 @@
+// Baseline MCU decoding: one routine per coefficient range, each running
+// on the fast or the careful byte-fetch policy of the bit reader.
+#include "entropy/mcu.h"
+
+#include <cstring>
+
+#include "entropy/bitreader.h"
+
+namespace vj {
+
+bool g_entropy_careful_only = false;
+
+uint32_t entropy_top_up(DecoderInfo* d, uint32_t want) {
+  StreamWindow* w = d->window;
+  IoStream* s = w->stream;
+  if (w->remaining >= want || s == nullptr) return w->remaining;
+  if (s->kind == kIoMemory || s->kind == kIoMemoryOwned) {
+    // The block is contiguous: further bytes simply follow the window.
+    while (w->remaining < want) {
+      uint8_t* at = nullptr;
+      const int32_t n = KOLVAVETA_Read_IO2(s, &at, kWindowSize);
+      if (n <= 0) break;
+      if (w->remaining == 0) w->window = at;
+      w->remaining += static_cast<uint32_t>(n);
+      w->consumed += static_cast<uint32_t>(n);
+    }
+    d->input_buffer = w->window;
+    return w->remaining;
+  }
+  uint8_t* buffer = w->buffer != nullptr ? w->buffer : d->input_buffer;
+  if (buffer == nullptr) return w->remaining;
+  if (w->remaining > 0 && w->window != buffer) std::memmove(buffer, w->window, w->remaining);
+  w->window = buffer;
+  w->index = 0;
+  while (w->remaining < kWindowSize) {
+    uint8_t* dst = buffer + w->remaining;
+    const int32_t n = KOLVAVETA_Read_IO2(s, &dst, kWindowSize - w->remaining);
+    if (n <= 0) break;
+    w->remaining += static_cast<uint32_t>(n);
+    w->consumed += static_cast<uint32_t>(n);
+    if (w->remaining >= want && w->remaining >= kWindowSize / 2) break;
+  }
+  d->input_buffer = buffer;
+  return w->remaining;
+}
+
+}  // namespace vj
+
+namespace {
+
+using vj::BitReader;
+using vj::CarefulFetch;
+using vj::FastFetch;
+
+// What a decoder keeps of each block.
+enum class Keep {
+  kAll,   // decode and store coefficients up to a zig-zag limit
+  kNone,  // skip: only the DC predictor is kept up to date
+};
+
+// Decodes one block, storing coefficients at zig-zag positions up to
+// kLastStored. Returns false when the input ended.
+template <int kLastStored, class R>
+inline bool decode_block(R& r, const DerivedHuffTable* dct, const DerivedHuffTable* act,
+                         int16_t* blk, int32_t* pred, int32_t* last_out) {
+  int32_t s = r.decode(dct);
+  if (s < 0) return false;
+  int32_t diff = 0;
+  if (s != 0 && !r.receive(s, &diff)) return false;
+  *pred += diff;
+  blk[0] = static_cast<int16_t>(*pred);
+  int32_t last = 0;
+  for (int32_t k = 1; k < 64; ++k) {
+    const int32_t rs = r.decode(act);
+    if (rs < 0) return false;
+    const int32_t run = rs >> 4;
+    s = rs & 15;
+    if (s != 0) {
+      k += run;
+      if (kLastStored == 63 || k <= kLastStored) {
+        int32_t v;
+        if (!r.receive(s, &v)) return false;
+        blk[VETAJ_NATURAL_ORDER[k]] = static_cast<int16_t>(v);
+        last = k;
+      } else if (!r.drop(s)) {
+        return false;
+      }
+    } else {
+      if (run != 15) break;
+      k += 15;
+    }
+  }
+  *last_out = last;
+  return true;
+}
+
+// Steps over the AC data of one block with the skip table, several symbols
+// per lookup; ends exactly where a full decode of the block would.
+template <class R>
+inline bool skip_ac(R& r, const DerivedHuffTable* act, const AcSkipTable* skip) {
+  int32_t k = 1;
+  while (k < 64) {
+    r.prefetch8();
+    if (r.bits >= 8) {
+      const uint32_t entry = skip->entry[r.peek(8)];
+      if (entry != 0) {
+        const int32_t advance = static_cast<int32_t>(entry >> 16);
+        const int32_t nbits = static_cast<int32_t>(entry & 0xFFFF);
+        if (advance >= static_cast<int32_t>(kSkipEob)) {
+          if (k + advance - static_cast<int32_t>(kSkipEob) < 64) {
+            r.bits -= nbits;  // may go negative: the next refill restores it
+            return true;
+          }
+        } else if (k + advance <= 64) {
+          r.bits -= nbits;
+          k += advance;
+          continue;
+        }
+        // The lookup runs past the end of the block: finish symbol by symbol.
+      }
+    }
+    const int32_t rs = r.decode(act);
+    if (rs < 0) return false;
+    const int32_t run = rs >> 4;
+    const int32_t s = rs & 15;
+    if (s != 0) {
+      k += run + 1;
+      if (!r.drop(s)) return false;
+    } else if (run == 15) {
+      k += 16;
+    } else {
+      return true;
+    }
+  }
+  return true;
+}
+
+// The blocks of one MCU on one fetch policy.
+template <int kLastStored, Keep kKeep, bool kDcCheck, class Fetch>
+bool run_mcu(BitReader<Fetch>& r, DecoderInfo* d, int16_t** blocks, bool* dc_out_of_range) {
+  EntropyState* e = d->entropy;
+  int32_t pred[4] = {e->last_dc[0], e->last_dc[1], e->last_dc[2], e->last_dc[3]};
+  const uint32_t nb = d->blocks_in_mcu;
+  for (uint32_t b = 0; b < nb; ++b) {
+    const DerivedHuffTable* dct = e->block_dc[b];
+    const DerivedHuffTable* act = e->block_ac[b];
+    if (dct == nullptr || act == nullptr) return false;
+    int32_t* p = &pred[d->mcu_membership[b] & 3];
+    if constexpr (kKeep == Keep::kNone) {
+      const AcSkipTable* skip = e->block_skip[b];
+      if (skip != nullptr) {
+        int32_t s = r.decode(dct);
+        if (s < 0) return false;
+        int32_t diff = 0;
+        if (s != 0 && !r.receive(s, &diff)) return false;
+        *p += diff;
+        if (!skip_ac(r, act, skip)) return false;
+      } else {
+        // No skip table for this table: decode the block into scratch space.
+        alignas(16) int16_t scratch[64];
+        int32_t last;
+        if (!decode_block<0>(r, dct, act, scratch, p, &last)) return false;
+      }
+    } else {
+      if (!decode_block<kLastStored>(r, dct, act, blocks[b], p, &d->last_nonzero[b]))
+        return false;
+      if constexpr (kDcCheck) {
+        if (*p < -2047 || *p > 2047) *dc_out_of_range = true;
+      }
+    }
+  }
+  for (int i = 0; i < 4; ++i) e->last_dc[i] = pred[i];
+  return true;
+}
+
+// Shared MCU entry: restarts, the insufficient-data rule, then the fast
+// policy when the window holds enough bytes, else (or after a marker) the
+// careful one.
+template <int kLastStored, Keep kKeep, bool kDcCheck>
+int32_t decode_mcu(DecoderInfo* d, int16_t** blocks) {
+  EntropyState* e = d->entropy;
+  if (e == nullptr || d->window == nullptr) return 0;
+  if (d->restart_interval != 0) {
+    if (e->restarts_to_go == 0 && VETAJ_ProcessRestartMarker(d) == 0) return 0;
+    if (d->index_use_state == 0 && d->region_map_flag == 0) {
+      const int32_t skip = VETAJ_SkipMcuUsingRST(d);
+      if (skip == 1 || skip == 2) return 1;
+    }
+  }
+  if (e->insufficient != 0) {
+    --e->restarts_to_go;
+    return 1;
+  }
+  const uint32_t nb = d->blocks_in_mcu;
+  bool dc_bad = false;
+  const uint32_t margin = vj::fast_margin(nb);
+  if (d->unread_marker == 0 && !vj::g_entropy_careful_only &&
+      vj::entropy_top_up(d, margin) >= margin) {
+    const int32_t saved_dc[4] = {e->last_dc[0], e->last_dc[1], e->last_dc[2], e->last_dc[3]};
+    BitReader<FastFetch> fast(d);
+    if (run_mcu<kLastStored, kKeep, kDcCheck>(fast, d, blocks, &dc_bad) && !fast.marker_seen) {
+      fast.store();
+      --e->restarts_to_go;
+      return dc_bad ? 0 : 1;
+    }
+    // A marker was met: decode this MCU again with the exact refill rule.
+    for (int i = 0; i < 4; ++i) e->last_dc[i] = saved_dc[i];
+    if constexpr (kKeep != Keep::kNone) {
+      for (uint32_t b = 0; b < nb; ++b) std::memset(blocks[b], 0, 64 * sizeof(int16_t));
+    }
+    dc_bad = false;
+  }
+  BitReader<CarefulFetch> careful(d);
+  const bool ok = run_mcu<kLastStored, kKeep, kDcCheck>(careful, d, blocks, &dc_bad);
+  careful.store();
+  if (!ok) return 0;
+  --e->restarts_to_go;
+  return dc_bad ? 0 : 1;
+}
+
+}  // namespace
+
+int32_t VETAJ_DecodeMcu(DecoderInfo* d, int16_t** blocks) {
+  return decode_mcu<63, Keep::kAll, false>(d, blocks);
+}
+int32_t VETAJ_DecodeMcu_2to1(DecoderInfo* d, int16_t** blocks) {
+  return decode_mcu<18, Keep::kAll, false>(d, blocks);
+}
+int32_t VETAJ_DecodeMcu_4to1(DecoderInfo* d, int16_t** blocks) {
+  return decode_mcu<4, Keep::kAll, false>(d, blocks);
+}
+int32_t VETAJ_DecodeMcu_8to3(DecoderInfo* d, int16_t** blocks) {
+  return decode_mcu<8, Keep::kAll, false>(d, blocks);
+}
+int32_t VETAJ_DecodeMcu_8to1(DecoderInfo* d, int16_t** blocks) {
+  return decode_mcu<0, Keep::kAll, true>(d, blocks);
+}
+int32_t VETAJ_SkipMcu(DecoderInfo* d) { return decode_mcu<0, Keep::kNone, false>(d, nullptr); }
+
+int32_t VETAJ_FastDecodeMcu(DecoderInfo* d, int16_t** blocks) {
+  EntropyState* e = d->entropy;
+  if (e == nullptr || d->window == nullptr) return 0;
+  if (d->restart_interval != 0 && e->restarts_to_go == 0 && VETAJ_ProcessRestartMarker(d) == 0)
+    return 0;
+  if (e->insufficient != 0) {
+    --e->restarts_to_go;
+    return 1;
+  }
+  const uint32_t nb = d->blocks_in_mcu;
+  // A pending end-of-band run passes over whole blocks first.
+  uint32_t first = 0;
+  if (d->eob_run != 0) {
+    if (d->eob_run < nb) {
+      first = d->eob_run;
+      d->eob_run = 0;
+    } else {
+      d->eob_run -= nb;
+      --e->restarts_to_go;
+      return 1;
+    }
+  }
+  BitReader<CarefulFetch> r(d);
+  int32_t pred[4] = {e->last_dc[0], e->last_dc[1], e->last_dc[2], e->last_dc[3]};
+  const int32_t ss = static_cast<int32_t>(d->Ss);
+  const int32_t se = static_cast<int32_t>(d->Se > 63 ? 63 : d->Se);
+  for (uint32_t b = first; b < nb; ++b) {
+    const DerivedHuffTable* dct = e->block_dc[b];
+    const DerivedHuffTable* act = e->block_ac[b];
+    const uint32_t* ratio = e->block_ratios[b];
+    if (dct == nullptr || act == nullptr) {
+      r.store();
+      return 0;
+    }
+    int16_t* blk = blocks[b];
+    int32_t* p = &pred[d->mcu_membership[b] & 3];
+    int32_t s = r.decode(dct);
+    int32_t diff = 0;
+    if (s < 0 || (s != 0 && !r.receive(s, &diff))) {
+      r.store();
+      return 0;
+    }
+    *p += diff;
+    blk[0] = static_cast<int16_t>(*p);
+    int32_t last = 0;
+    for (int32_t k = ss + 1; k <= se; ++k) {
+      const int32_t rs = r.decode(act);
+      if (rs < 0) {
+        r.store();
+        return 0;
+      }
+      const int32_t run = rs >> 4;
+      s = rs & 15;
+      if (s != 0) {
+        k += run;
+        int32_t v;
+        if (!r.receive(s, &v)) {
+          r.store();
+          return 0;
+        }
+        // Requantise in Q13, rounding toward zero.
+        const int32_t rk = ratio != nullptr ? static_cast<int32_t>(ratio[k & 63]) : 0x2000;
+        const int32_t t = v > 0 ? v * rk : v * rk + 0x1FFF;
+        const int32_t q = t >> 13;
+        if (q != 0) {
+          blk[VETAJ_NATURAL_ORDER[k]] = static_cast<int16_t>(q);
+          last = k;
+        }
+      } else {
+        if (run != 15) break;
+        k += 15;
+      }
+    }
+    d->last_nonzero[b] = last;
+  }
+  for (int i = 0; i < 4; ++i) e->last_dc[i] = pred[i];
+  r.store();
+  --e->restarts_to_go;
+  return 1;
+}
+
+int32_t VETAJ_ProcessRestartMarker(DecoderInfo* d) {
+  EntropyState* e = d->entropy;
+  MarkerState* m = d->marker;
+  if (e == nullptr || m == nullptr) return 0;
+  if (e->bits_left > 0) m->discarded += static_cast<uint32_t>(e->bits_left) / 8;
+  e->bits_left = 0;
+  if (d->unread_marker == 0) {
+    BitReader<CarefulFetch> r(d);
+    for (;;) {
+      int32_t c = CarefulFetch::raw(r);
+      if (c < 0) {
+        r.store();
+        return 0;
+      }
+      if (c != 0xFF) {
+        ++m->discarded;
+        continue;
+      }
+      do {
+        c = CarefulFetch::raw(r);
+      } while (c == 0xFF);
+      if (c < 0) {
+        r.store();
+        return 0;
+      }
+      if (c == 0) {
+        m->discarded += 2;
+        continue;
+      }
+      d->unread_marker = static_cast<uint32_t>(c);
+      break;
+    }
+    r.bits = 0;
+    r.store();
+  }
+  if (d->unread_marker == 0xD0u + m->next_restart) d->unread_marker = 0;
+  m->next_restart = static_cast<uint8_t>((m->next_restart + 1) & 7);
+  for (uint32_t i = 0; i < d->comps_in_scan && i < 4; ++i) e->last_dc[i] = 0;
+  if (d->unread_marker == 0) e->insufficient = 0;
+  e->restarts_to_go = d->restart_interval;
+  return 1;
+}
+
+int32_t VETAJ_SkipMcuUsingRST(DecoderInfo* d) {
+  const DecInfo* o = d->owner;
+  if (o == nullptr || o->region_mode == 0 || d->restart_interval == 0) return 0;
+  const uint32_t mcu_h = d->mcu_height_px != 0 ? d->mcu_height_px : 8;
+  const uint32_t mcu_w = d->mcu_width_px != 0 ? d->mcu_width_px : 8;
+  const uint32_t first_row = o->region_top / mcu_h;
+  const uint32_t row = d->current_mcu_row;
+  const uint32_t col = d->current_mcu_col;
+  if (row >= first_row) return 0;
+  const uint64_t here = uint64_t(row) * d->mcus_per_row + col;
+  if (here > uint64_t(d->mcus_per_row) * first_row + o->region_left / mcu_w) return 0;
+  const uint32_t ri = d->restart_interval;
+  const uint32_t phase = d->mcus_per_row % ri == 0 ? 0 : (row * d->mcus_per_row) % ri;
+  if ((phase + col) % ri != 0) return 2;
+  VETAJ_ProcessRestartMarker(d);
+  return 1;
+}
+
+int32_t VETAJ_ReadBits(BitWorkState* state, uint32_t buffer, int32_t bits_left, int32_t nbits) {
+  DecoderInfo* d = state->decoder;
+  BitReader<CarefulFetch> r(d);
+  r.buf = buffer;
+  r.bits = bits_left;
+  r.eof_as_marker = true;
+  if (r.bits <= 24 && !r.ensure(nbits > 25 ? 25 : nbits)) return 0;
+  state->buffer = r.buf;
+  state->bits_left = r.bits;
+  d->entropy->insufficient = r.insufficient;
+  d->window->window = const_cast<uint8_t*>(r.cur);
+  d->window->remaining = r.avail;
+  return 1;
+}
+
+int32_t VETAJ_DecodeHuffMan(BitWorkState* state, uint32_t buffer, int32_t bits_left,
+                            const DerivedHuffTable* table, int32_t min_bits) {
+  DecoderInfo* d = state->decoder;
+  BitReader<CarefulFetch> r(d);
+  r.buf = buffer;
+  r.bits = bits_left;
+  r.eof_as_marker = true;
+  const int32_t l = min_bits < 1 ? 1 : (min_bits > 16 ? 16 : min_bits);
+  if (r.bits < l && !r.ensure(l)) return -1;
+  const int32_t sym = r.slow_decode(table, l, r.take(l));
+  state->buffer = r.buf;
+  state->bits_left = r.bits;
+  d->entropy->insufficient = r.insufficient;
+  d->window->window = const_cast<uint8_t*>(r.cur);
+  d->window->remaining = r.avail;
+  return sym;
+}
