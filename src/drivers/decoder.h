@@ -13,6 +13,7 @@
 #include "syntax/markers.h"
 
 struct Upsampler;        // reconstruction: per-component upsampling record
+struct Resampler;        // reconstruction: state of the resizing colour converters
 struct ScanInfo;         // saved state of one progressive scan
 struct EntropySnapshot;  // saved entropy-decoder position (scan index)
 
@@ -26,7 +27,9 @@ constexpr int32_t kColourYcck = 5;
 // Decoder function types.
 using McuDecodeFn = int32_t (*)(DecoderInfo* decoder, int16_t** blocks);
 using RowDecodeFn = int32_t (*)(DecoderInfo* decoder, uint8_t*** row_buffers);
-using ConvertFn = void (*)(DecoderInfo* decoder, uint8_t* output_rows, uint32_t rows);
+// Row converter: rows[c][i] is row i of the batch of component c (upsampled
+// to the full sample grid); writes what the batch yields to the output.
+using ConvertFn = void (*)(DecoderInfo* decoder, uint8_t* const* const* rows, uint32_t count);
 // Fused upsample-and-convert writer: luma rows r and r+1, chroma rows, width.
 using FusedWriterFn = void (*)(DecoderInfo* decoder, const uint8_t* y0, const uint8_t* y1,
                                const uint8_t* cb, const uint8_t* cr, uint32_t width);
@@ -134,6 +137,17 @@ struct DecoderInfo {
   uint8_t* v_ptr;             // format 2: Cr plane cursor
   int32_t pixel_step;         // in pixels
   int32_t row_step;           // in bytes
+  // Planar output (format 2): plane bases and row lengths, so that rotated
+  // output can place chroma by output coordinates.
+  uint8_t* y_plane;
+  uint8_t* u_plane;
+  uint8_t* v_plane;
+  uint32_t y_stride;          // luma row length in bytes (the buffer width)
+  uint32_t c_stride;          // chroma row length in bytes: (width + 1) / 2
+  uint32_t plane_height;      // luma rows of the buffer
+  uint32_t path_code;         // decode-path code: selects the region column mask
+  uint32_t fused_rows;        // rows one fused writer call produces (0: no fused writer)
+  Resampler* resampler;       // owned by the colour converters
 
   // --- Progress checkpoints ---
   uint32_t progress_points[4];
