@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <memory>
@@ -75,7 +76,9 @@ TEST(Stats, GetIndexRegistersNewNamesAndFindsKnownOnes) {
 TEST(Stats, FullTableRefusesANewNameAndKeepsTheOldOnes) {
   Record r = fresh();
   for (int i = 0; i < JPEG_STAT_MAX_ENTRIES; ++i) {
-    ASSERT_EQ(jpeg_get_index(r.get(), ("m" + std::to_string(i)).c_str()), i);
+    char name[16];
+    std::snprintf(name, sizeof(name), "m%d", i);
+    ASSERT_EQ(jpeg_get_index(r.get(), name), i);
   }
   const Record before(new JpegStatInfo(*r));
   EXPECT_EQ(jpeg_get_index(r.get(), "one too many"), -1);
