@@ -6,6 +6,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <memory>
+#include <ostream>
 #include <string>
 #include <vector>
 
@@ -247,6 +248,7 @@ struct ReverseCase {
   const char* in;
   const char* out;
 };
+void PrintTo(const ReverseCase& c, std::ostream* os) { *os << '"' << c.in << '"'; }
 class StatsReverse : public ::testing::TestWithParam<ReverseCase> {};
 
 TEST_P(StatsReverse, ReversesInPlace) {
