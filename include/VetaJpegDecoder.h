@@ -480,7 +480,8 @@ VETAJ_API int32_t KOLVAVETA_SkiaDecodeJPEG(DecInfo* object, void* output_buffer,
  * use (it returns -1) and registers a name longer than
  * JPEG_STAT_NAME_SIZE - 1 characters truncated to that length (so a later
  * lookup of the same long name finds it again); argument texts longer than
- * JPEG_STAT_ARGUMENT_SIZE - 1 characters are truncated. */
+ * JPEG_STAT_ARGUMENT_SIZE - 1 characters are truncated. accumulate_stat_info
+ * adds times and call counts with saturation at the 32-bit limits. */
 #define JPEG_STAT_MAX_ENTRIES 1024
 #define JPEG_STAT_NAME_SIZE 128
 #define JPEG_STAT_ARGUMENT_SIZE 512
