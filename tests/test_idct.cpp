@@ -510,6 +510,27 @@ TEST_P(RoutineEdgeTest, DcOnlyBlocksGiveTheRoundedMean) {
   }
 }
 
+// One AC coefficient (with or without a DC) whose product is +-2^p: such
+// values land exactly on the rounding boundaries of the descaling shifts.
+TEST_P(RoutineEdgeTest, SingleAcBlocksOnRoundingBoundaries) {
+  const Routine& rt = GetParam();
+  for (int k = 1; k < 64; ++k) {
+    for (int p = 0; p < 16; ++p) {
+      for (int sign : {1, -1}) {
+        for (int16_t dc = -3; dc <= 4; ++dc) {
+          Block b;
+          for (auto& m : b.mult) m = 1;
+          b.coef[0] = dc;
+          b.coef[k] = static_cast<int16_t>(sign * (1 << (p % 8)));
+          b.mult[k] = 1u << (p - p % 8);
+          ASSERT_EQ(run(rt.fn, lib_centre(), b, rt.w, rt.h), rt.ref(b))
+              << "position " << k << " product " << sign << " x 2^" << p << " dc " << dc;
+        }
+      }
+    }
+  }
+}
+
 INSTANTIATE_TEST_SUITE_P(All, RoutineEdgeTest, ::testing::ValuesIn(kRoutines),
                          [](const auto& param_info) {
                            return std::string("R") + param_info.param.name;
