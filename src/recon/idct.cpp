@@ -41,8 +41,8 @@ void islow(const uint8_t* centre, const uint32_t* mult, const int16_t* coef, uin
 }
 
 // Natural-order position of each zig-zag index 0..27.
-constexpr uint8_t kZigzag[28] = {0,  1,  8,  16, 9,  2,  3,  10, 17, 24, 32, 25, 18, 11,
-                                 4,  5,  12, 19, 26, 33, 40, 48, 41, 34, 27, 20, 13, 6};
+constexpr uint8_t kZigzag[28] = {0, 1, 8,  16, 9,  2,  3,  10, 17, 24, 32, 25, 18, 11,
+                                 4, 5, 12, 19, 26, 33, 40, 48, 41, 34, 27, 20, 13, 6};
 
 // Side of the square box (top-left n x n coefficients) that holds every
 // zig-zag position up to k, for k < 28. Square boxes keep the number of
@@ -75,14 +75,15 @@ void VETAJ_DoIdct_islow(const uint8_t* centre, const uint32_t* multipliers,
 // Slot k holds the routine for blocks whose coefficients end at zig-zag
 // position k; slot 28 (k >= 28) the full transform.
 extern "C" const VETAJ_IdctFn pIDctFunc[29] = {
-    kSparseSlot<0>,  kSparseSlot<1>,  kSparseSlot<2>,  kSparseSlot<3>,  kSparseSlot<4>,
-    kSparseSlot<5>,  kSparseSlot<6>,  kSparseSlot<7>,  kSparseSlot<8>,  kSparseSlot<9>,
-    kSparseSlot<10>, kSparseSlot<11>, kSparseSlot<12>, kSparseSlot<13>, kSparseSlot<14>,
-    kSparseSlot<15>, kSparseSlot<16>, kSparseSlot<17>, kSparseSlot<18>, kSparseSlot<19>,
-    kSparseSlot<20>, kSparseSlot<21>, kSparseSlot<22>, kSparseSlot<23>, kSparseSlot<24>,
+    kSparseSlot<0>,  kSparseSlot<1>,  kSparseSlot<2>,  kSparseSlot<3>,    kSparseSlot<4>,
+    kSparseSlot<5>,  kSparseSlot<6>,  kSparseSlot<7>,  kSparseSlot<8>,    kSparseSlot<9>,
+    kSparseSlot<10>, kSparseSlot<11>, kSparseSlot<12>, kSparseSlot<13>,   kSparseSlot<14>,
+    kSparseSlot<15>, kSparseSlot<16>, kSparseSlot<17>, kSparseSlot<18>,   kSparseSlot<19>,
+    kSparseSlot<20>, kSparseSlot<21>, kSparseSlot<22>, kSparseSlot<23>,   kSparseSlot<24>,
     kSparseSlot<25>, kSparseSlot<26>, kSparseSlot<27>, VETAJ_DoIdct_islow};
 
-#define VJ_SLOTS7(fn) {fn, fn, fn, fn, fn, fn, fn}
+#define VJ_SLOTS7(fn) \
+  { fn, fn, fn, fn, fn, fn, fn }
 
 // Every slot the full transform.
 extern "C" const VETAJ_IdctFn pIDctFuncIslow[29] = {

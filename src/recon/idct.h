@@ -23,33 +23,26 @@
 
 // --- Transforms (the name gives output width x height) ---
 
+// Function type of every transform (the type VETAJ_IdctFn points to).
+using IdctRoutine = void(const uint8_t* centre, const uint32_t* multipliers,
+                         const int16_t* coefficients, uint8_t** output_rows, uint32_t output_col);
+
 // 8x8 accurate integer transform.
-void VETAJ_DoIdct_islow(const uint8_t* centre, const uint32_t* multipliers,
-                        const int16_t* coefficients, uint8_t** output_rows, uint32_t output_col);
+IdctRoutine VETAJ_DoIdct_islow;
 // Square reductions: 1/2 (4x4), 1/4 (2x2), 1/8 (1x1).
-void VETAJ_DoIdct_4x4(const uint8_t* centre, const uint32_t* multipliers,
-                      const int16_t* coefficients, uint8_t** output_rows, uint32_t output_col);
-void VETAJ_DoIdct_2x2(const uint8_t* centre, const uint32_t* multipliers,
-                      const int16_t* coefficients, uint8_t** output_rows, uint32_t output_col);
-void VETAJ_DoIdct_1x1(const uint8_t* centre, const uint32_t* multipliers,
-                      const int16_t* coefficients, uint8_t** output_rows, uint32_t output_col);
+IdctRoutine VETAJ_DoIdct_4x4;
+IdctRoutine VETAJ_DoIdct_2x2;
+IdctRoutine VETAJ_DoIdct_1x1;
 // Rectangular sizes of the per-component scaled mode.
-void VETAJ_DoIdct_8x4(const uint8_t* centre, const uint32_t* multipliers,
-                      const int16_t* coefficients, uint8_t** output_rows, uint32_t output_col);
-void VETAJ_DoIdct_4x8(const uint8_t* centre, const uint32_t* multipliers,
-                      const int16_t* coefficients, uint8_t** output_rows, uint32_t output_col);
-void VETAJ_DoIdct_4x2(const uint8_t* centre, const uint32_t* multipliers,
-                      const int16_t* coefficients, uint8_t** output_rows, uint32_t output_col);
-void VETAJ_DoIdct_2x4(const uint8_t* centre, const uint32_t* multipliers,
-                      const int16_t* coefficients, uint8_t** output_rows, uint32_t output_col);
-void VETAJ_DoIdct_2x1(const uint8_t* centre, const uint32_t* multipliers,
-                      const int16_t* coefficients, uint8_t** output_rows, uint32_t output_col);
-void VETAJ_DoIdct_1x2(const uint8_t* centre, const uint32_t* multipliers,
-                      const int16_t* coefficients, uint8_t** output_rows, uint32_t output_col);
+IdctRoutine VETAJ_DoIdct_8x4;
+IdctRoutine VETAJ_DoIdct_4x8;
+IdctRoutine VETAJ_DoIdct_4x2;
+IdctRoutine VETAJ_DoIdct_2x4;
+IdctRoutine VETAJ_DoIdct_2x1;
+IdctRoutine VETAJ_DoIdct_1x2;
 // 3/8 scale: 3x3 output. Its multipliers carry the AAN scale factors (build
 // them with vj_build_aan_multipliers), not the plain quantisers.
-void VETAJ_DoIdct_8to3(const uint8_t* centre, const uint32_t* multipliers,
-                       const int16_t* coefficients, uint8_t** output_rows, uint32_t output_col);
+IdctRoutine VETAJ_DoIdct_8to3;
 
 // --- Slot templates ---
 //

@@ -53,8 +53,8 @@ struct Out8 {
 // even part and `round` to tmp0/tmp1 after scaling: the first pass uses
 // (0, 1 << 10) and the second pass (16, 0) so that both rounding terms are
 // in place for the shifts by 11 and 18. Outputs are in sample order.
-inline Out8 kernel8(w32 i0, w32 i1, w32 i2, w32 i3, w32 i4, w32 i5, w32 i6, w32 i7,
-                    w32 dc_bias, w32 round) {
+inline Out8 kernel8(w32 i0, w32 i1, w32 i2, w32 i3, w32 i4, w32 i5, w32 i6, w32 i7, w32 dc_bias,
+                    w32 round) {
   // Even part.
   w32 z1 = (i2 + i6) * kFix_0_541196100;
   const w32 tmp2 = z1 - i6 * kFix_1_847759065;
@@ -77,8 +77,8 @@ inline Out8 kernel8(w32 i0, w32 i1, w32 i2, w32 i3, w32 i4, w32 i5, w32 i6, w32 
   w32 o1 = i5 * kFix_2_053119869;
   w32 o2 = i3 * kFix_3_072711026;
   w32 o3 = i1 * kFix_1_501321110;
-  z1 *= fix(-7373);   // -0.899976223
-  z2 *= fix(-20995);  // -2.562915447
+  z1 *= fix(-7373);            // -0.899976223
+  z2 *= fix(-20995);           // -2.562915447
   z3 = z3 * fix(-16069) + z5;  // -1.961570560
   z4 = z4 * fix(-3196) + z5;   // -0.390180644
   o0 += z1 + z3;
@@ -86,8 +86,8 @@ inline Out8 kernel8(w32 i0, w32 i1, w32 i2, w32 i3, w32 i4, w32 i5, w32 i6, w32 
   o2 += z2 + z3;
   o3 += z1 + z4;
 
-  return Out8{{tmp10 + o3, tmp11 + o2, tmp12 + o1, tmp13 + o0, tmp13 - o0, tmp12 - o1,
-               tmp11 - o2, tmp10 - o3}};
+  return Out8{{tmp10 + o3, tmp11 + o2, tmp12 + o1, tmp13 + o0, tmp13 - o0, tmp12 - o1, tmp11 - o2,
+               tmp10 - o3}};
 }
 
 // Odd half of the 4-point kernel: p and q from inputs e1 and e3, with

@@ -2,7 +2,6 @@
 // 1/4 and 1/8 scales, the mixed sizes of the per-component scaled mode and
 // the 3x3 transform of the 3/8 scale.
 #include "recon/idct.h"
-
 #include "recon/idct_kernels.h"
 
 namespace vj::idct {
@@ -74,8 +73,8 @@ void VETAJ_DoIdct_4x4(const uint8_t* centre, const uint32_t* mult, const int16_t
   for (int c = 0; c < 8; ++c) {
     if (c == 4) continue;
     auto d = [&](int r) { return dequant(coef[8 * r + c], mult[8 * r + c]); };
-    if ((coef[8 + c] | coef[16 + c] | coef[24 + c] | coef[40 + c] | coef[48 + c] |
-         coef[56 + c]) == 0) {
+    if ((coef[8 + c] | coef[16 + c] | coef[24 + c] | coef[40 + c] | coef[48 + c] | coef[56 + c]) ==
+        0) {
       const w32 dc = d(0) << 2;
       for (int r = 0; r < 4; ++r) ws[r][c] = dc;
       continue;
@@ -181,8 +180,8 @@ namespace {
 // `second`): side by side (2x1, second = 1) or one above the other (1x2,
 // second = 8).
 template <int kSecond>
-void idct_pair(const uint8_t* centre, const uint32_t* mult, const int16_t* coef,
-               uint8_t** rows, uint32_t col) {
+void idct_pair(const uint8_t* centre, const uint32_t* mult, const int16_t* coef, uint8_t** rows,
+               uint32_t col) {
   const w32 a = dequant(coef[0], mult[0]) + 4;
   const w32 b = dequant(coef[kSecond], mult[kSecond]);
   const uint8_t s0 = sample(centre, a + b, 3);
@@ -244,8 +243,10 @@ void VETAJ_DoIdct_8to3(const uint8_t* centre, const uint32_t* mult, const int16_
     const w32 g = sra(k1_847 * w1, 8) - w1;
     const w32 h = w0 - w2;
     const w32 k = h + sra(k1_414 * w2, 8);
-    out[0] = static_cast<uint8_t>((sample(centre, k + g, 5) + sample(centre, w2 + w0 + w1, 5)) >> 1);
+    out[0] =
+        static_cast<uint8_t>((sample(centre, k + g, 5) + sample(centre, w2 + w0 + w1, 5)) >> 1);
     out[1] = sample(centre, h, 5);
-    out[2] = static_cast<uint8_t>((sample(centre, k - g, 5) + sample(centre, w2 + w0 - w1, 5)) >> 1);
+    out[2] =
+        static_cast<uint8_t>((sample(centre, k - g, 5) + sample(centre, w2 + w0 - w1, 5)) >> 1);
   }
 }
