@@ -386,6 +386,12 @@ VETAJ_API int32_t VETAJ_GetDctMethodIndex(int32_t last_index);
 /* Constant tables. */
 VETAJ_API extern const uint8_t VETAJ_NATURAL_ORDER[80];
 VETAJ_API extern const int32_t VETAJ_HUFF_EXTEND_TEST[16];
+/* Inverse transform slot templates. Full size: slot min(k, 28) for a block
+ * whose last coefficient is at zig-zag position k; pIDctFunc holds routines
+ * specialised for blocks ending at k (k must be exact or larger),
+ * pIDctFuncIslow the full transform in every slot. pIDctResizeFunc: by
+ * scale index 0 (full, the uniform template), 1 (1/2), 2 (1/4), 3 (1/8);
+ * entries 1..3 have 7 slots, every slot holding the same routine. */
 VETAJ_API extern const VETAJ_IdctFn pIDctFunc[29];
 VETAJ_API extern const VETAJ_IdctFn pIDctFuncIslow[29];
 VETAJ_API extern const VETAJ_IdctFn* const pIDctResizeFunc[4];
