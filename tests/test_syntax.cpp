@@ -1,0 +1,830 @@
+// The decoder's marker reader and the file-header pre-scan.
+#include <gtest/gtest.h>
+
+#include <cstring>
+#include <functional>
+#include <string>
+#include <tuple>
+#include <vector>
+
+#include "drivers/decoder.h"
+#include "io/stream.h"
+#include "support/segments.h"
+#include "syntax/markers.h"
+
+namespace {
+
+using vjtest::Bytes;
+using vjtest::JpegBuilder;
+
+// A decoder set up as the header reader leaves it before the first marker:
+// a window on a stream over `bytes`, a zeroed MarkerState with the Adobe
+// transform at 1.
+class MarkerReader {
+ public:
+  explicit MarkerReader(const Bytes& bytes, int32_t kind = 1) : data_(bytes) {
+    const uint32_t size = static_cast<uint32_t>(data_.size());
+    if (size == 0) kind = 4;  // a memory input cannot be empty
+    if (kind == 4) {
+      source_.data = data_;
+      stream_ = KOLVAVETA_Open_Stream(&source_, vjtest::CallbackSource::read,
+                                      vjtest::CallbackSource::skip,
+                                      vjtest::CallbackSource::rewind, size);
+    } else {
+      stream_ = KOLVAVETA_Open_IO(kind, data_.data(), size);
+    }
+    vj::window_open(&window_, stream_);
+    decoder_ = vj::alloc_zeroed<DecoderInfo>();
+    decoder_->window = &window_;
+    decoder_->stream = stream_;
+    decoder_->marker = vj::fake_alloc_zeroed<MarkerState>();
+    decoder_->marker->adobe_transform = 1;
+  }
+  ~MarkerReader() {
+    VETAJ_DeleteDecoderInfo(decoder_);
+    KOLVAVETA_OsFree(decoder_);
+    vj::window_close(&window_);
+    // A caller stream converted to a memory stream owns its block now.
+    if (stream_->kind == 5) KOLVAVETA_OsFree(stream_->source);
+    KOLVAVETA_Close_IO(stream_);
+  }
+  MarkerReader(const MarkerReader&) = delete;
+  MarkerReader& operator=(const MarkerReader&) = delete;
+
+  // One call of the marker reader; returns its status.
+  int32_t next(uint8_t* code = nullptr) {
+    int32_t status = -1;
+    const uint8_t c = VETAJ_ParseNextMarker(decoder_, &status);
+    if (code != nullptr) *code = c;
+    return status;
+  }
+  DecoderInfo* d() const { return decoder_; }
+  MarkerState* m() const { return decoder_->marker; }
+  StreamWindow* w() { return &window_; }
+  IoStream* stream() const { return stream_; }
+  // The next unread input byte.
+  int32_t peek() { return vj::window_byte(&window_); }
+
+ private:
+  Bytes data_;
+  vjtest::CallbackSource source_;
+  IoStream* stream_ = nullptr;
+  StreamWindow window_{};
+  DecoderInfo* decoder_ = nullptr;
+};
+
+const Bytes kCounts{0, 1, 1, 1, 1, 1, 1, 1, 1, 1, 1, 1, 0, 0, 0, 0};
+const Bytes kSymbols{0, 1, 2, 3, 4, 5, 6, 7, 8, 9, 10};
+
+TEST(ParseNextMarker, ReadsABaselineHeaderIntoTheDecoder) {
+  Bytes two_tables = vjtest::dht_spec(0x00, kCounts, kSymbols);
+  Bytes ac = vjtest::dht_spec(0x13, kCounts, kSymbols);
+  two_tables.insert(two_tables.end(), ac.begin(), ac.end());
+  JpegBuilder b;
+  b.soi()
+      .dqt(0, 1)
+      .dqt(3, 100)
+      .sof(0xC0, 300, 200, {{7, 2, 1, 0}, {8, 1, 2, 3}, {9, 1, 1, 3}})
+      .segment(0xC4, two_tables)
+      .dri(12)
+      .sos({{7, 0x03}, {8, 0x03}, {9, 0x03}}, 1, 5, 0x01)
+      .raw({0xAB});
+  MarkerReader r(b.bytes());
+  uint8_t code = 0;
+  ASSERT_EQ(r.next(&code), 200);
+  EXPECT_EQ(code, 0xDA);
+  EXPECT_EQ(r.peek(), 0xAB) << "window left at the first entropy-coded byte";
+
+  DecoderInfo* d = r.d();
+  EXPECT_EQ(d->num_components, 3);
+  EXPECT_EQ(d->image_width, 300);
+  EXPECT_EQ(d->image_height, 200);
+  EXPECT_EQ(d->max_h_samp, 2);
+  EXPECT_EQ(d->max_v_samp, 2);
+  ASSERT_NE(d->components, nullptr);
+  const uint8_t ids[3] = {7, 8, 9}, hs[3] = {2, 1, 1}, vs[3] = {1, 2, 1}, tq[3] = {0, 3, 3};
+  for (int i = 0; i < 3; ++i) {
+    EXPECT_EQ(d->components[i].id, ids[i]);
+    EXPECT_EQ(d->components[i].index, i);
+    EXPECT_EQ(d->components[i].h_samp, hs[i]);
+    EXPECT_EQ(d->components[i].v_samp, vs[i]);
+    EXPECT_EQ(d->components[i].quant_no, tq[i]);
+    EXPECT_EQ(d->components[i].dc_no, 0);
+    EXPECT_EQ(d->components[i].ac_no, 3);
+    EXPECT_EQ(d->scan_components[i], &d->components[i]);
+    EXPECT_EQ(r.m()->component_ids[i], ids[i]);
+  }
+  EXPECT_EQ(d->scan_comp_index, 2u);
+  EXPECT_EQ(d->comps_in_scan, 3);
+  EXPECT_EQ(d->first_scan_comps, -1);
+
+  // Quantisation values land in natural order: zig-zag position 2 is (1,0).
+  ASSERT_NE(d->quant_tables[0], nullptr);
+  ASSERT_NE(d->quant_tables[3], nullptr);
+  EXPECT_EQ(d->quant_tables[1], nullptr);
+  EXPECT_EQ(d->quant_tables[0]->values[0], 1);
+  EXPECT_EQ(d->quant_tables[0]->values[1], 2);
+  EXPECT_EQ(d->quant_tables[0]->values[8], 3);
+  EXPECT_EQ(d->quant_tables[0]->values[63], 64);
+  EXPECT_EQ(d->quant_tables[3]->values[16], 103);
+
+  // Two specifications in one DHT fill two store slots and both pointers.
+  EXPECT_EQ(d->huff_store_count, 2u);
+  EXPECT_EQ(d->dc_huff[0], d->huff_store[0]);
+  EXPECT_EQ(d->ac_huff[3], d->huff_store[1]);
+  EXPECT_EQ(0, std::memcmp(d->huff_store[1]->bits + 1, kCounts.data(), 16));
+  EXPECT_EQ(0, std::memcmp(d->huff_store[1]->huffval, kSymbols.data(), kSymbols.size()));
+
+  EXPECT_EQ(d->restart_interval, 12u);
+  // A baseline scan always covers the whole band at full precision.
+  EXPECT_EQ(d->Ss, 0u);
+  EXPECT_EQ(d->Se, 63u);
+  EXPECT_EQ(d->Ah, 0u);
+  EXPECT_EQ(d->Al, 0u);
+
+  const MarkerState* m = r.m();
+  EXPECT_EQ(m->frame_kind, 1);
+  EXPECT_EQ(m->seen_sos, 1);
+  EXPECT_EQ(m->seen_dht, 1);
+  EXPECT_EQ(m->seen_dqt, 1);
+  EXPECT_EQ(m->seen_app0, 0);
+  EXPECT_EQ(m->seen_adobe, 0);
+  EXPECT_EQ(m->adobe_transform, 1);
+}
+
+TEST(ParseNextMarker, AcceptsFillBytesGarbageAndOtherCodesBetweenSegments) {
+  JpegBuilder b;
+  b.raw({0x00, 0x11, 0xFF, 0xD8, 0xFF, 0xFF, 0xFF})
+      .sof(0xC0, 8, 8, {{1, 1, 1, 0}})
+      .raw({0x55, 0x66, 0xFF, 0xD0, 0xFF, 0x00, 0xFF, 0xFF})
+      .segment(0xE3, {1, 2, 3})
+      .segment(0xFE, {})
+      .segment(0xDC, {0, 8})
+      .sos({{1, 0x00}})
+      .raw({0x42});
+  MarkerReader r(b.bytes());
+  ASSERT_EQ(r.next(), 200);
+  EXPECT_EQ(r.peek(), 0x42);
+}
+
+TEST(ParseNextMarker, ProgressiveScansKeepTheirBandAndFirstScanCount) {
+  JpegBuilder b;
+  b.soi()
+      .sof(0xC2, 16, 16, {{1, 1, 1, 0}, {2, 1, 1, 0}, {3, 1, 1, 0}})
+      .sos({{1, 0x00}}, 0, 0, 0x01)
+      .raw({0x01})
+      .sos({{2, 0x01}}, 1, 5, 0x21)
+      .raw({0x02})
+      .sos({{1, 0x00}, {2, 0x00}, {3, 0x00}}, 0, 0, 0x10)
+      .raw({0x03});
+  MarkerReader r(b.bytes());
+  ASSERT_EQ(r.next(), 200);
+  EXPECT_EQ(r.m()->frame_kind, 2);
+  EXPECT_EQ(r.d()->first_scan_comps, 1);
+  EXPECT_EQ(r.peek(), 0x01);
+  ASSERT_EQ(r.next(), 200);
+  EXPECT_EQ(r.d()->Ss, 1u);
+  EXPECT_EQ(r.d()->Se, 5u);
+  EXPECT_EQ(r.d()->Ah, 2u);
+  EXPECT_EQ(r.d()->Al, 1u);
+  EXPECT_EQ(r.d()->scan_comp_index, 1u);
+  EXPECT_EQ(r.d()->first_scan_comps, 1) << "later scans leave the first-scan count";
+  ASSERT_EQ(r.next(), 200);
+  EXPECT_EQ(r.d()->comps_in_scan, 3);
+  EXPECT_EQ(r.d()->first_scan_comps, 1);
+  // No further scan: the walk ends with 201.
+  EXPECT_EQ(r.next(), 201);
+}
+
+TEST(ParseNextMarker, ReadsAdobeAndApp0Flags) {
+  Bytes adobe{'A', 'd', 'o', 'b', 'e', 0, 100, 0, 0, 0, 0, 2};
+  JpegBuilder b;
+  b.soi()
+      .segment(0xE0, {'J', 'F', 'I', 'F', 0})
+      .segment(0xEE, adobe)
+      .sof(0xC0, 8, 8, {{1, 1, 1, 0}})
+      .sos({{1, 0x00}});
+  MarkerReader r(b.bytes());
+  ASSERT_EQ(r.next(), 200);
+  EXPECT_EQ(r.m()->seen_app0, 1);
+  EXPECT_EQ(r.m()->seen_adobe, 1);
+  EXPECT_EQ(r.m()->adobe_transform, 2);
+
+  // An APP14 too short to hold the transform, or not "Adobe", is only skipped.
+  JpegBuilder c;
+  c.soi()
+      .segment(0xEE, {'A', 'd', 'o', 'b', 'e', 0, 100, 0, 0, 0, 0})
+      .segment(0xEE, {'B', 'd', 'o', 'b', 'e', 0, 100, 0, 0, 0, 0, 0})
+      .sof(0xC0, 8, 8, {{1, 1, 1, 0}})
+      .sos({{1, 0x00}});
+  MarkerReader r2(c.bytes());
+  ASSERT_EQ(r2.next(), 200);
+  EXPECT_EQ(r2.m()->seen_adobe, 0);
+  EXPECT_EQ(r2.m()->adobe_transform, 1);
+}
+
+TEST(ParseNextMarker, RedefinedTablesTakeNewSlotsUpToTheStoreSize) {
+  auto stream_with = [](uint32_t specs) {
+    JpegBuilder b;
+    b.soi().sof(0xC0, 8, 8, {{1, 1, 1, 0}});
+    for (uint32_t i = 0; i < specs; ++i) b.dht(0x00, kCounts, kSymbols);
+    b.sos({{1, 0x00}});
+    return b.bytes();
+  };
+  MarkerReader full(stream_with(kMaxTableSpecs));
+  ASSERT_EQ(full.next(), 200);
+  EXPECT_EQ(full.d()->huff_store_count, kMaxTableSpecs);
+  EXPECT_EQ(full.d()->dc_huff[0], full.d()->huff_store[kMaxTableSpecs - 1]);
+
+  MarkerReader over(stream_with(kMaxTableSpecs + 1));
+  EXPECT_EQ(over.next(), 201);
+  EXPECT_EQ(over.d()->huff_store_count, kMaxTableSpecs);
+}
+
+// Streams that the marker reader must refuse with status 201.
+struct BadHeader {
+  const char* name;
+  Bytes bytes;
+};
+
+Bytes with_frame(const std::function<void(JpegBuilder&)>& middle, bool progressive = false) {
+  JpegBuilder b;
+  b.soi().sof(progressive ? 0xC2 : 0xC0, 16, 16, {{1, 1, 1, 0}, {2, 1, 1, 0}});
+  middle(b);
+  b.sos({{1, 0x00}}).raw({0x00});
+  return b.bytes();
+}
+
+Bytes raw_segment(uint8_t code, const Bytes& length_and_payload) {
+  Bytes out{0xFF, code};
+  out.insert(out.end(), length_and_payload.begin(), length_and_payload.end());
+  return out;
+}
+
+std::vector<BadHeader> bad_headers() {
+  std::vector<BadHeader> v;
+  auto add = [&](const char* name, const Bytes& bytes) { v.push_back({name, bytes}); };
+  auto sof = [](uint8_t code, uint32_t w, uint32_t h, const std::vector<vjtest::FrameComp>& c,
+                uint8_t precision = 8) {
+    JpegBuilder b;
+    b.soi().sof(code, w, h, c, precision).sos({{1, 0x00}}).raw({0});
+    return b.bytes();
+  };
+  add("Precision12", sof(0xC0, 8, 8, {{1, 1, 1, 0}}, 12));
+  add("Width50001", sof(0xC0, 50001, 8, {{1, 1, 1, 0}}));
+  add("Height50001", sof(0xC2, 8, 50001, {{1, 1, 1, 0}}));
+  add("FiveComponents", sof(0xC0, 8, 8, {{1, 1, 1, 0}, {2, 1, 1, 0}, {3, 1, 1, 0},
+                                         {4, 1, 1, 0}, {5, 1, 1, 0}}));
+  add("NoComponents", sof(0xC0, 8, 8, {}));
+  add("SamplingZero", sof(0xC0, 8, 8, {{1, 0, 1, 0}}));
+  add("SamplingFive", sof(0xC0, 8, 8, {{1, 1, 5, 0}}));
+  add("ExtendedFrameIsNoFrame", sof(0xC1, 8, 8, {{1, 1, 1, 0}}));
+  add("ArithmeticFrameIsNoFrame", sof(0xC9, 8, 8, {{1, 1, 1, 0}}));
+  {
+    // Nf 3 with Lf 18: the length must be 3 * 3 + 8 = 17.
+    JpegBuilder b;
+    b.soi().raw(
+        raw_segment(0xC0, {0, 18, 8, 0, 8, 0, 8, 3, 1, 0x11, 0, 2, 0x11, 0, 3, 0x11, 0, 0}));
+    b.sos({{1, 0x00}});
+    add("FrameLengthMismatch", b.bytes());
+  }
+  add("SecondFrame", with_frame([](JpegBuilder& b) { b.sof(0xC0, 8, 8, {{1, 1, 1, 0}}); }));
+  add("SecondFrameProgressive",
+      with_frame([](JpegBuilder& b) { b.sof(0xC2, 8, 8, {{1, 1, 1, 0}}); }));
+  {
+    JpegBuilder b;
+    b.soi().dqt(0).sos({{1, 0x00}}).sof(0xC0, 8, 8, {{1, 1, 1, 0}});
+    add("ScanBeforeFrame", b.bytes());
+  }
+  add("DqtSixteenBit", with_frame([](JpegBuilder& b) { b.dqt(0x10); }));
+  add("DqtTableFour", with_frame([](JpegBuilder& b) { b.dqt(4); }));
+  add("DqtLengthShort", with_frame([](JpegBuilder& b) {
+        Bytes p{0x00};
+        p.resize(64, 1);  // one value short
+        b.segment(0xDB, p);
+      }));
+  add("DqtLengthOne", with_frame([](JpegBuilder& b) { b.raw(raw_segment(0xDB, {0, 1})); }));
+  add("DhtClassTwo", with_frame([](JpegBuilder& b) { b.dht(0x20, kCounts, kSymbols); }));
+  add("DhtTableFour", with_frame([](JpegBuilder& b) { b.dht(0x04, kCounts, kSymbols); }));
+  add("DhtCountsOver256", with_frame([](JpegBuilder& b) {
+        b.dht(0x00, Bytes(16, 17), Bytes(272, 0));
+      }));
+  add("DhtSymbolsPastSegment", with_frame([](JpegBuilder& b) {
+        b.dht(0x00, kCounts, Bytes(kSymbols.begin(), kSymbols.end() - 1));
+      }));
+  add("DhtHeadCut", with_frame([](JpegBuilder& b) { b.segment(0xC4, Bytes(10, 0)); }));
+  add("DhtLengthZero", with_frame([](JpegBuilder& b) { b.raw(raw_segment(0xC4, {0, 0})); }));
+  add("DriLengthFive", with_frame([](JpegBuilder& b) { b.segment(0xDD, {0, 1, 0}); }));
+  add("AppLengthOne", with_frame([](JpegBuilder& b) { b.raw(raw_segment(0xE1, {0, 1})); }));
+  add("ComLengthZero", with_frame([](JpegBuilder& b) { b.raw(raw_segment(0xFE, {0, 0})); }));
+  {
+    JpegBuilder b;
+    b.soi().sof(0xC0, 8, 8, {{1, 1, 1, 0}}).raw(raw_segment(0xE1, {0xFF, 0xF0, 1, 2, 3}));
+    add("AppPastTheEnd", b.bytes());
+  }
+  auto scan = [](const std::vector<vjtest::ScanComp>& c, uint8_t ss = 0, uint8_t se = 63,
+                 uint8_t ahal = 0) {
+    JpegBuilder b;
+    b.soi().sof(0xC2, 8, 8, {{1, 1, 1, 0}, {2, 1, 1, 0}}).sos(c, ss, se, ahal).raw({0});
+    return b.bytes();
+  };
+  add("ScanComponentNotInFrame", scan({{3, 0x00}}));
+  add("ScanComponentTwice", scan({{1, 0x00}, {1, 0x00}}));
+  add("ScanNoComponents", scan({}));
+  add("ScanFiveComponents", scan({{1, 0}, {2, 0}, {1, 0}, {2, 0}, {1, 0}}));
+  add("ScanDcTableFour", scan({{1, 0x40}}));
+  add("ScanAcTableFour", scan({{1, 0x04}}));
+  add("ProgressiveBandPast63", scan({{1, 0x00}}, 1, 64));
+  add("ProgressiveBandReversed", scan({{1, 0x00}}, 6, 5));
+  add("ProgressiveApproxPast13", scan({{1, 0x00}}, 0, 0, 0x0E));
+  {
+    JpegBuilder b;
+    b.soi().sof(0xC0, 8, 8, {{1, 1, 1, 0}}).raw(raw_segment(0xDA, {0, 9, 1, 1, 0, 0, 63, 0}));
+    add("ScanLengthMismatch", b.bytes());
+  }
+  {
+    JpegBuilder b;
+    b.soi().sof(0xC0, 8, 8, {{1, 1, 1, 0}}).eoi().raw({0, 0, 0});
+    add("EoiBeforeScan", b.bytes());
+  }
+  add("Empty", {});
+  add("OnlyFillBytes", Bytes(40, 0xFF));
+  return v;
+}
+
+class ParseNextMarkerRefuses : public ::testing::TestWithParam<BadHeader> {};
+
+TEST_P(ParseNextMarkerRefuses, WithStatus201AndNoScanReported) {
+  // Exactly sized heap copy: any read past the end is caught by the sanitizers.
+  MarkerReader r(GetParam().bytes);
+  uint8_t code = 0;
+  EXPECT_EQ(r.next(&code), 201);
+  EXPECT_NE(code, 0xDA);
+  EXPECT_EQ(r.m()->seen_sos, 0);
+}
+
+INSTANTIATE_TEST_SUITE_P(BadHeaders, ParseNextMarkerRefuses, ::testing::ValuesIn(bad_headers()),
+                         [](const auto& p) { return std::string(p.param.name); });
+
+// Every prefix of a complete header, read through a memory block and through
+// a caller stream, fails cleanly except the complete ones.
+TEST(ParseNextMarker, TruncatedHeadersFailCleanly) {
+  JpegBuilder b;
+  b.soi()
+      .segment(0xE0, {'J', 'F', 'I', 'F', 0, 1, 2, 0, 0, 1, 0, 1, 0, 0})
+      .dqt(0)
+      .dqt(1)
+      .sof(0xC0, 33, 17, {{1, 2, 2, 0}, {2, 1, 1, 1}, {3, 1, 1, 1}, {4, 1, 1, 1}})
+      .dht(0x00, kCounts, kSymbols)
+      .dht(0x10, kCounts, kSymbols)
+      .dri(3)
+      .sos({{1, 0x00}, {2, 0x00}, {3, 0x00}, {4, 0x00}});
+  const Bytes full = b.bytes();
+  for (int32_t kind : {1, 4}) {
+    for (size_t n = 0; n < full.size(); ++n) {
+      MarkerReader r(Bytes(full.begin(), full.begin() + static_cast<long>(n)), kind);
+      EXPECT_EQ(r.next(), 201) << "prefix " << n << " kind " << kind;
+    }
+    MarkerReader r(full, kind);
+    EXPECT_EQ(r.next(), 200);
+  }
+}
+
+// A caller stream is read whole into memory at a progressive frame.
+class StreamConversion : public ::testing::TestWithParam<bool> {};
+
+TEST_P(StreamConversion, TurnsACallerStreamIntoAMemoryStream) {
+  const bool large = GetParam();
+  JpegBuilder b;
+  b.soi();
+  if (large) b.com(30000, 0x11).com(20000, 0x22);
+  b.sof(0xC2, 8, 8, {{1, 1, 1, 0}}).sos({{1, 0x00}}, 0, 0, 0).raw({0x5A});
+  b.com(40, 0x33).sos({{1, 0x00}}, 1, 63, 0).raw({0xA5});
+  const Bytes bytes = b.bytes();
+  MarkerReader r(bytes, 4);
+  ASSERT_EQ(r.next(), 200);
+  IoStream* s = r.stream();
+  ASSERT_EQ(s->kind, 5);
+  EXPECT_EQ(s->size, bytes.size());
+  EXPECT_EQ(s->read_callback, nullptr);
+  EXPECT_EQ(s->skip_callback, nullptr);
+  const auto* block = static_cast<const uint8_t*>(s->source);
+  // The whole input, the part before the window included (the source can
+  // rewind), is in the block.
+  EXPECT_EQ(0, std::memcmp(block, bytes.data(), bytes.size()));
+  // The window reads on seamlessly from the block.
+  EXPECT_EQ(r.peek(), 0x5A);
+  ASSERT_EQ(r.next(), 200);
+  EXPECT_EQ(r.d()->Ss, 1u);
+  EXPECT_EQ(r.peek(), 0xA5);
+  // And absolute seeks work now.
+  EXPECT_EQ(KOLVAVETA_Seek_IO(s, 2, 0), 2);
+}
+
+INSTANTIATE_TEST_SUITE_P(Sizes, StreamConversion, ::testing::Bool(),
+                         [](const auto& p) { return p.param ? "Large" : "Small"; });
+
+TEST(ParseNextMarker, StreamConversionRefusesAnUnknownOrTooSmallSize) {
+  JpegBuilder b;
+  b.soi().sof(0xC2, 8, 8, {{1, 1, 1, 0}}).sos({{1, 0x00}}, 0, 0, 0).raw({0x5A});
+  for (uint32_t size : {0u, 5u}) {
+    vjtest::CallbackSource source;
+    source.data = b.bytes();
+    IoStream* s = KOLVAVETA_Open_Stream(&source, vjtest::CallbackSource::read,
+                                        vjtest::CallbackSource::skip,
+                                        vjtest::CallbackSource::rewind, size);
+    StreamWindow w;
+    ASSERT_TRUE(vj::window_open(&w, s));
+    DecoderInfo* d = vj::alloc_zeroed<DecoderInfo>();
+    d->window = &w;
+    d->stream = s;
+    d->marker = vj::fake_alloc_zeroed<MarkerState>();
+    int32_t status = 0;
+    VETAJ_ParseNextMarker(d, &status);
+    EXPECT_EQ(status, 201) << "size " << size;
+    EXPECT_EQ(s->kind, 4);
+    VETAJ_DeleteDecoderInfo(d);
+    KOLVAVETA_OsFree(d);
+    vj::window_close(&w);
+    KOLVAVETA_Close_IO(s);
+  }
+}
+
+TEST(ParseNextMarker, RefusesADecoderWithoutWindowOrMarkerState) {
+  DecoderInfo* d = vj::alloc_zeroed<DecoderInfo>();
+  int32_t status = 0;
+  EXPECT_EQ(VETAJ_ParseNextMarker(d, &status), 0);
+  EXPECT_EQ(status, 201);
+  KOLVAVETA_OsFree(d);
+}
+
+// ---------------------------------------------------------------------------
+// File-header pre-scan
+
+// Runs the pre-scan over a memory block; returns its status.
+int32_t prescan(const Bytes& bytes, FileHeaderInfo* h, int32_t mode = 8) {
+  IoStream* s = KOLVAVETA_Open_IO(1, const_cast<uint8_t*>(bytes.data()),
+                                  static_cast<uint32_t>(bytes.size()));
+  if (s == nullptr) return -1;
+  StreamWindow w;
+  vj::window_open(&w, s);
+  const int32_t status = VETAJ_ParseFileHeader(&w, mode, h);
+  vj::window_close(&w);
+  KOLVAVETA_Close_IO(s);
+  return status;
+}
+
+// A stream with the given APP segments before a 640x480 baseline frame.
+Bytes with_app(const std::vector<std::pair<uint8_t, Bytes>>& apps, size_t tail = 64) {
+  JpegBuilder b;
+  b.soi();
+  for (const auto& [code, payload] : apps) b.segment(code, payload);
+  b.dqt(0).sof(0xC0, 640, 480, {{1, 2, 2, 0}, {2, 1, 1, 0}, {3, 1, 1, 0}});
+  b.sos({{1, 0x00}, {2, 0x11}, {3, 0x11}}).raw(Bytes(tail, 0x12)).eoi();
+  return b.bytes();
+}
+
+Bytes jfif(uint8_t major, uint8_t tw, uint8_t th, size_t pixel_bytes) {
+  Bytes p{'J', 'F', 'I', 'F', 0, major, 2, 1, 0, 72, 0, 72, tw, th};
+  if (major != 1) {  // other versions: the size sits one byte earlier
+    p[11] = tw;
+    p[12] = th;
+    p[13] = 0;
+  }
+  p.resize(p.size() + pixel_bytes, 0x80);
+  return p;
+}
+
+TEST(ParseFileHeader, ReportsSizeProgressiveFlagAndStopsAtTheScan) {
+  FileHeaderInfo h{};
+  h.thumbnail.unused9 = 77;
+  h.thumbnail.x_resolution[1] = 5;
+  EXPECT_EQ(prescan(with_app({}), &h), 200);
+  EXPECT_EQ(h.width, 640);
+  EXPECT_EQ(h.height, 480);
+  EXPECT_EQ(h.progressive, 0);
+  EXPECT_EQ(h.thumbnail.present, 0);
+  EXPECT_EQ(h.thumbnail.unused9, 77) << "words 9..14 pass through";
+  EXPECT_EQ(h.thumbnail.x_resolution[1], 5u);
+
+  FileHeaderInfo p{};
+  EXPECT_EQ(prescan(vjtest::small_progressive(17, 33), &p), 200);
+  EXPECT_EQ(p.width, 17);
+  EXPECT_EQ(p.height, 33);
+  EXPECT_EQ(p.progressive, 1);
+}
+
+TEST(ParseFileHeader, RefusesBadModesMissingSoiAndMalformedSegments) {
+  FileHeaderInfo h{};
+  EXPECT_EQ(prescan(with_app({}), &h, 3), 201);
+  EXPECT_EQ(prescan(with_app({}), &h, 2), 200);
+  Bytes no_soi = with_app({});
+  no_soi[1] = 0xD7;
+  EXPECT_EQ(prescan(no_soi, &h), 201);
+  // An APP0 claiming more bytes than the input holds.
+  Bytes big = with_app({{0xE0, Bytes(100, 0)}});
+  big[4] = 0x40;
+  EXPECT_EQ(prescan(big, &h), 201);
+  JpegBuilder b;
+  b.soi().sof(0xC0, 0, 8, {{1, 1, 1, 0}}).sos({{1, 0}});
+  EXPECT_EQ(prescan(b.bytes(), &h), 201) << "zero width";
+  JpegBuilder c;
+  c.soi().sof(0xC0, 8, 8, {{1, 1, 1, 0}}, 12).sos({{1, 0}});
+  EXPECT_EQ(prescan(c.bytes(), &h), 201) << "12-bit";
+  JpegBuilder e;
+  e.soi().sof(0xC0, 8, 8, {{1, 1, 1, 0}}).eoi();
+  EXPECT_EQ(prescan(e.bytes(), &h), 201) << "no scan";
+}
+
+TEST(ParseFileHeader, FindsAJfifThumbnail) {
+  const Bytes stream = with_app({{0xE0, jfif(1, 2, 2, 12)}});
+  FileHeaderInfo h{};
+  ASSERT_EQ(prescan(stream, &h), 200);
+  const ThumbnailInfo& t = h.thumbnail;
+  EXPECT_EQ(t.present, 1);
+  EXPECT_EQ(t.format, 1);
+  EXPECT_EQ(t.colour, 2);
+  EXPECT_EQ(t.length, 12u);
+  EXPECT_EQ(t.width, 2);
+  EXPECT_EQ(t.height, 2);
+  EXPECT_EQ(t.offset, 2u + 4u + 14u) << "SOI, marker and length, JFIF header";
+  EXPECT_EQ(stream[t.offset], 0x80);
+
+  FileHeaderInfo v2{};
+  ASSERT_EQ(prescan(with_app({{0xE0, jfif(2, 3, 1, 9)}}), &v2), 200);
+  EXPECT_EQ(v2.thumbnail.present, 1);
+  EXPECT_EQ(v2.thumbnail.length, 9u);
+
+  for (const Bytes& payload : {jfif(1, 2, 2, 11), jfif(1, 0, 2, 0), jfif(1, 2, 2, 13)}) {
+    FileHeaderInfo n{};
+    ASSERT_EQ(prescan(with_app({{0xE0, payload}}), &n), 200);
+    EXPECT_EQ(n.thumbnail.present, 0);
+  }
+}
+
+Bytes jfxx(uint8_t code, const Bytes& data) {
+  Bytes p{'J', 'F', 'X', 'X', 0, code};
+  p.insert(p.end(), data.begin(), data.end());
+  return p;
+}
+
+TEST(ParseFileHeader, FindsJfxxThumbnails) {
+  {
+    const Bytes embedded{0xFF, 0xD8, 0xFF, 0xD9};
+    const Bytes stream = with_app({{0xE0, jfxx(0x10, embedded)}});
+    FileHeaderInfo h{};
+    ASSERT_EQ(prescan(stream, &h), 200);
+    EXPECT_EQ(h.thumbnail.present, 1);
+    EXPECT_EQ(h.thumbnail.format, 6);
+    EXPECT_EQ(h.thumbnail.length, 4u);
+    EXPECT_EQ(h.thumbnail.offset, 2u + 4u + 6u);
+  }
+  {
+    Bytes rgb{3, 2};
+    rgb.resize(2 + 18, 0x40);
+    const Bytes stream = with_app({{0xE0, jfxx(0x13, rgb)}});
+    FileHeaderInfo h{};
+    ASSERT_EQ(prescan(stream, &h), 200);
+    EXPECT_EQ(h.thumbnail.present, 1);
+    EXPECT_EQ(h.thumbnail.format, 1);
+    EXPECT_EQ(h.thumbnail.colour, 2);
+    EXPECT_EQ(h.thumbnail.width, 3);
+    EXPECT_EQ(h.thumbnail.height, 2);
+    EXPECT_EQ(h.thumbnail.length, 18u);
+    EXPECT_EQ(h.thumbnail.offset, 2u + 4u + 8u);
+  }
+  {
+    Bytes palette{2, 2};
+    palette.resize(2 + 768 + 4, 0x01);
+    FileHeaderInfo h{};
+    ASSERT_EQ(prescan(with_app({{0xE0, jfxx(0x11, palette)}}), &h), 200);
+    EXPECT_EQ(h.thumbnail.present, 1);
+    EXPECT_EQ(h.thumbnail.length, 768u + 4u);
+  }
+  // Sizes that do not match the data, and unknown extension codes, are no thumbnail.
+  for (const Bytes& payload : {jfxx(0x13, {3, 2, 1, 2, 3}), jfxx(0x11, {1, 1, 0}),
+                               jfxx(0x13, {0, 2}), jfxx(0x12, {1, 1, 0, 0, 0}), jfxx(0x10, {})}) {
+    FileHeaderInfo h{};
+    ASSERT_EQ(prescan(with_app({{0xE0, payload}}), &h), 200);
+    EXPECT_EQ(h.thumbnail.present, 0);
+  }
+}
+
+// An Exif APP1 payload: IFD0 with one entry, IFD1 with the given entries.
+struct IfdEntry {
+  uint16_t tag, type;
+  uint32_t value;
+};
+
+Bytes exif(bool big, const std::vector<IfdEntry>& ifd1, uint32_t ifd0_at = 8,
+           size_t padding = 0) {
+  Bytes t;
+  auto u16 = [&](uint32_t v) {
+    if (big) {
+      t.push_back(static_cast<uint8_t>(v >> 8));
+      t.push_back(static_cast<uint8_t>(v));
+    } else {
+      t.push_back(static_cast<uint8_t>(v));
+      t.push_back(static_cast<uint8_t>(v >> 8));
+    }
+  };
+  auto u32 = [&](uint32_t v) {
+    if (big) {
+      u16(v >> 16);
+      u16(v & 0xFFFF);
+    } else {
+      u16(v & 0xFFFF);
+      u16(v >> 16);
+    }
+  };
+  auto entry = [&](const IfdEntry& e) {
+    u16(e.tag);
+    u16(e.type);
+    u32(1);
+    if (e.type == 3 || e.type == 8) {
+      u16(e.value);
+      u16(0);
+    } else if (e.type == 1 || e.type == 2 || e.type == 6 || e.type == 7) {
+      t.push_back(static_cast<uint8_t>(e.value));
+      t.insert(t.end(), 3, 0);
+    } else {
+      u32(e.value);
+    }
+  };
+  t.push_back(big ? 'M' : 'I');
+  t.push_back(big ? 'M' : 'I');
+  u16(42);
+  u32(ifd0_at == 8 ? static_cast<uint32_t>(8 + padding) : ifd0_at);
+  t.resize(8 + padding, 0xEE);  // padding before IFD0 pushes IFD1 past the window
+  u16(1);
+  entry({0x112, 3, 1});
+  const uint32_t ifd1_at = static_cast<uint32_t>(t.size() + 4);
+  u32(ifd1_at);
+  u16(static_cast<uint32_t>(ifd1.size()));
+  for (const IfdEntry& e : ifd1) entry(e);
+  u32(0);
+  Bytes p{'E', 'x', 'i', 'f', 0, 0};
+  p.insert(p.end(), t.begin(), t.end());
+  return p;
+}
+
+class ExifThumbnail : public ::testing::TestWithParam<std::tuple<bool, size_t>> {};
+
+TEST_P(ExifThumbnail, IsLocatedFromIfd1) {
+  const auto [big, padding] = GetParam();
+  const std::vector<IfdEntry> ifd1{{0x100, 3, 160}, {0x101, 4, 120}, {0x103, 3, 6},
+                                   {0x106, 3, 2},   {0x11C, 3, 1},   {0x201, 4, 30},
+                                   {0x202, 4, 400}, {0x104D, 1, 9},  {0x11A, 5, 0}};
+  const Bytes stream = with_app({{0xE1, exif(big, ifd1, 8, padding)}}, 600);
+  FileHeaderInfo h{};
+  ASSERT_EQ(prescan(stream, &h), 200);
+  const ThumbnailInfo& t = h.thumbnail;
+  EXPECT_EQ(t.present, 1);
+  EXPECT_EQ(t.width, 160);
+  EXPECT_EQ(t.height, 120);
+  EXPECT_EQ(t.format, 6);
+  EXPECT_EQ(t.colour, 2);
+  EXPECT_EQ(t.planar, 1);
+  EXPECT_EQ(t.vendor, 9);
+  EXPECT_EQ(t.length, 400u);
+  EXPECT_EQ(t.offset, 2u + 4u + 6u + 30u) << "relative to the TIFF header";
+}
+
+INSTANTIATE_TEST_SUITE_P(ByteOrders, ExifThumbnail,
+                         ::testing::Combine(::testing::Bool(), ::testing::Values(0, 20000)));
+
+TEST(ParseFileHeader, UncompressedExifThumbnailUsesStrips) {
+  const std::vector<IfdEntry> ifd1{{0x103, 3, 1}, {0x111, 4, 40}, {0x117, 4, 48}};
+  FileHeaderInfo h{};
+  ASSERT_EQ(prescan(with_app({{0xE1, exif(false, ifd1)}}), &h), 200);
+  EXPECT_EQ(h.thumbnail.present, 1);
+  EXPECT_EQ(h.thumbnail.format, 0);
+  EXPECT_EQ(h.thumbnail.length, 48u);
+  EXPECT_EQ(h.thumbnail.offset, 12u + 40u);
+}
+
+TEST(ParseFileHeader, MalformedExifIsSkippedWithoutAThumbnail) {
+  const std::vector<IfdEntry> good{{0x201, 4, 30}, {0x202, 4, 40}};
+  std::vector<Bytes> payloads;
+  payloads.push_back(exif(false, {{0x201, 4, 30}, {0x202, 13, 40}}));  // bad type
+  payloads.push_back(exif(false, good, 5000));                         // IFD0 past the segment
+  payloads.push_back(exif(true, {{0x201, 4, 30}}));                    // no length
+  payloads.push_back(exif(true, {{0x201, 4, 0xFFFFFF00}, {0x202, 4, 40}}));  // past the input
+  payloads.push_back(exif(false, {{0x201, 4, 30}, {0x202, 4, 0x7FFFFFFF}}));  // likewise
+  Bytes order = exif(false, good);
+  order[6] = 'X';
+  payloads.push_back(order);
+  Bytes magic = exif(false, good);
+  magic[8] = 43;
+  payloads.push_back(magic);
+  Bytes no_next = exif(false, good);
+  no_next[6 + 8 + 2 + 12] = 0;  // next-IFD offset 0
+  no_next[6 + 8 + 2 + 12 + 1] = 0;
+  payloads.push_back(no_next);
+  Bytes many = exif(false, good);
+  many[6 + 8 + 2 + 12 + 4] = 0xFF;  // IFD1 entry count running past the segment
+  payloads.push_back(many);
+  payloads.push_back(Bytes{'E', 'x', 'i', 'f', 0, 0, 'I', 'I'});
+  for (size_t i = 0; i < payloads.size(); ++i) {
+    FileHeaderInfo h{};
+    ASSERT_EQ(prescan(with_app({{0xE1, payloads[i]}}, 100), &h), 200) << i;
+    EXPECT_EQ(h.thumbnail.present, 0) << i;
+  }
+}
+
+Bytes resource(uint16_t id, const std::string& name, const Bytes& data) {
+  Bytes r{'8', 'B', 'I', 'M'};
+  vjtest::put16(&r, id);
+  r.push_back(static_cast<uint8_t>(name.size()));
+  r.insert(r.end(), name.begin(), name.end());
+  if (r.size() % 2 != 0) r.push_back(0);
+  vjtest::put32(&r, static_cast<uint32_t>(data.size()));
+  r.insert(r.end(), data.begin(), data.end());
+  if (r.size() % 2 != 0) r.push_back(0);
+  return r;
+}
+
+Bytes photoshop(const std::vector<Bytes>& resources) {
+  const char sig[] = "Photoshop 3.0";
+  Bytes p(sig, sig + sizeof sig);
+  for (const Bytes& r : resources) p.insert(p.end(), r.begin(), r.end());
+  return p;
+}
+
+Bytes thumb_resource(uint32_t format, uint32_t length, uint32_t data_bytes) {
+  Bytes d;
+  vjtest::put32(&d, format);
+  vjtest::put32(&d, 80);
+  vjtest::put32(&d, 60);
+  vjtest::put32(&d, 240);
+  vjtest::put32(&d, 14400);
+  vjtest::put32(&d, length);
+  vjtest::put16(&d, 24);
+  vjtest::put16(&d, 1);
+  d.resize(28 + data_bytes, 0xCC);
+  return d;
+}
+
+TEST(ParseFileHeader, FindsAnImageResourceThumbnail) {
+  const Bytes app13 = photoshop({resource(0x0409, "abc", Bytes(7, 1)),
+                                 resource(0x040C, "", thumb_resource(1, 50, 51))});
+  const Bytes stream = with_app({{0xED, app13}});
+  FileHeaderInfo h{};
+  ASSERT_EQ(prescan(stream, &h), 200);
+  const ThumbnailInfo& t = h.thumbnail;
+  EXPECT_EQ(t.present, 1);
+  EXPECT_EQ(t.format, 7);
+  EXPECT_EQ(t.width, 80);
+  EXPECT_EQ(t.height, 60);
+  EXPECT_EQ(t.length, 50u);
+  // SOI, marker and length, signature, the first resource (4+2+4+4+8), the
+  // second's head (4+2+2+4), the 28-byte thumbnail header.
+  EXPECT_EQ(t.offset, 2u + 4u + 14u + 22u + 12u + 28u);
+  EXPECT_EQ(stream[t.offset], 0xCC);
+
+  FileHeaderInfo raw{};
+  ASSERT_EQ(prescan(with_app({{0xED, photoshop({resource(0x040C, "x", thumb_resource(0, 8, 8))})}}),
+                    &raw),
+            200);
+  EXPECT_EQ(raw.thumbnail.format, 1);
+  EXPECT_EQ(raw.thumbnail.colour, 2);
+
+  // A thumbnail already found (JFIF) is kept: image resources are not read.
+  FileHeaderInfo both{};
+  ASSERT_EQ(prescan(with_app({{0xE0, jfif(1, 1, 1, 3)}, {0xED, app13}}), &both), 200);
+  EXPECT_EQ(both.thumbnail.format, 1);
+  EXPECT_EQ(both.thumbnail.length, 3u);
+
+  // Resources that run past the segment, or a thumbnail longer than its
+  // resource, give nothing.
+  for (const Bytes& bad : {photoshop({resource(0x040C, "", thumb_resource(1, 60, 51))}),
+                           photoshop({resource(0x040C, "", Bytes(20, 0))})}) {
+    FileHeaderInfo n{};
+    ASSERT_EQ(prescan(with_app({{0xED, bad}}), &n), 200);
+    EXPECT_EQ(n.thumbnail.present, 0);
+  }
+  Bytes cut = photoshop({resource(0x040C, "", thumb_resource(1, 50, 51))});
+  cut.resize(cut.size() - 40);
+  FileHeaderInfo n{};
+  ASSERT_EQ(prescan(with_app({{0xED, cut}}), &n), 200);
+  EXPECT_EQ(n.thumbnail.present, 0);
+}
+
+TEST(ParseFileHeader, TruncatedStreamsFailCleanly) {
+  const std::vector<IfdEntry> ifd1{{0x201, 4, 30}, {0x202, 4, 40}};
+  const Bytes full = with_app({{0xE0, jfif(1, 1, 1, 3)},
+                               {0xE1, exif(true, ifd1)},
+                               {0xED, photoshop({resource(0x040C, "", thumb_resource(1, 8, 8))})}},
+                              4);
+  size_t sos = 0;
+  for (size_t i = 0; i + 1 < full.size(); ++i)
+    if (full[i] == 0xFF && full[i + 1] == 0xDA) sos = i;
+  for (size_t n = 0; n < full.size(); ++n) {
+    FileHeaderInfo h{};
+    const Bytes cut(full.begin(), full.begin() + static_cast<long>(n));
+    const int32_t status = n == 0 ? 201 : prescan(cut, &h);
+    EXPECT_EQ(status, n >= sos + 2 ? 200 : 201) << "prefix " << n;
+  }
+}
+
+}  // namespace
