@@ -31,6 +31,7 @@ bool open_at(StreamWindow* w, IoStream* stream, uint32_t offset) {
 
 int32_t VETAJ_SimpleParser(StreamWindow* w, int32_t mode, uint32_t result[kSummaryWords]) {
   if (!vj::scan_to_soi(w, mode)) return kStatusFail;
+  bool have_frame = false;
   for (;;) {
     const int32_t code = vj::next_marker(w);
     if (code < 0) return kStatusFail;
@@ -41,12 +42,14 @@ int32_t VETAJ_SimpleParser(StreamWindow* w, int32_t mode, uint32_t result[kSumma
         if (!read_frame_words(w, true, result, &f)) return kStatusFail;
         result[kSummaryMaxH] = f.max_h;
         result[kSummaryMaxV] = f.max_v;
+        have_frame = true;
         break;
       }
       case vj::kMarkerSof2: {
         result[kSummaryProgressive] = 1;
         vj::FrameSize f;
         if (!read_frame_words(w, false, result, &f)) return kStatusFail;
+        have_frame = true;
         break;
       }
       case vj::kMarkerDri: {
@@ -57,7 +60,9 @@ int32_t VETAJ_SimpleParser(StreamWindow* w, int32_t mode, uint32_t result[kSumma
         break;
       }
       case vj::kMarkerSos:
-        return kStatusOk;
+        // A scan without a frame header we can read (none, or another frame
+        // type) has no summary to give.
+        return have_frame ? kStatusOk : kStatusFail;
       case vj::kMarkerDht:
       case vj::kMarkerDqt:
         if (!vj::skip_segment(w)) return kStatusFail;

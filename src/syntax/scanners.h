@@ -21,7 +21,8 @@ enum SummaryWord : uint32_t {
 
 // Reads from the window's position (at or before SOI) up to the first SOS and
 // fills `result` (see SummaryWord). `mode` must be 8 or 2. Returns 200 at the
-// first SOS and 201 on any failure, a malformed SOF0/SOF1 segment included.
+// first SOS and 201 on any failure: a malformed SOF0/SOF1/SOF2 segment, or an
+// SOS not preceded by one of those frame headers.
 int32_t VETAJ_SimpleParser(StreamWindow* window, int32_t mode, uint32_t result[kSummaryWords]);
 
 // Walks from SOI through every segment and the entropy-coded data to the EOI

@@ -1,0 +1,302 @@
+// The quick stream scanners and the JPEG header summary call.
+#include <gtest/gtest.h>
+
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include "io/stream.h"
+#include "support/segments.h"
+#include "syntax/scanners.h"
+
+namespace {
+
+using vjtest::Bytes;
+using vjtest::InputHolder;
+using vjtest::InputKind;
+using vjtest::JpegBuilder;
+
+// Runs the summary scanner over a memory block.
+int32_t summarise(const Bytes& bytes, uint32_t result[kSummaryWords], int32_t mode = 8) {
+  IoStream* s = KOLVAVETA_Open_IO(1, const_cast<uint8_t*>(bytes.data()),
+                                  static_cast<uint32_t>(bytes.size()));
+  if (s == nullptr) return -1;
+  StreamWindow w;
+  vj::window_open(&w, s);
+  const int32_t status = VETAJ_SimpleParser(&w, mode, result);
+  vj::window_close(&w);
+  KOLVAVETA_Close_IO(s);
+  return status;
+}
+
+// Runs the end-of-data scanner over a memory block; returns its status.
+int32_t find_end(const Bytes& bytes, uint32_t* end, uint32_t result[3]) {
+  IoStream* s = KOLVAVETA_Open_IO(1, const_cast<uint8_t*>(bytes.data()),
+                                  static_cast<uint32_t>(bytes.size()));
+  if (s == nullptr) return -1;
+  StreamWindow w;
+  vj::window_open(&w, s);
+  const int32_t status = VETAJ_EOIParser(&w, 8, result, end);
+  vj::window_close(&w);
+  KOLVAVETA_Close_IO(s);
+  return status;
+}
+
+Bytes patched(Bytes b, size_t at, uint8_t value) {
+  b[at] = value;
+  return b;
+}
+
+// Offset of the first marker `code` in a stream.
+size_t marker_at(const Bytes& b, uint8_t code) {
+  for (size_t i = 0; i + 1 < b.size(); ++i)
+    if (b[i] == 0xFF && b[i + 1] == code) return i;
+  return b.size();
+}
+
+struct SummaryCase {
+  const char* name;
+  Bytes bytes;
+  int32_t status;
+  uint32_t words[kSummaryWords];
+};
+
+std::vector<SummaryCase> summary_cases() {
+  const Bytes b420 = vjtest::small_baseline(33, 17, 2, 2);
+  const size_t sof = marker_at(b420, 0xC0);
+  Bytes garbage{0x00, 0xFF, 0x12, 0xD8, 0xFF, 0xFF, 0x00};
+  garbage.resize(3000, 0x5A);
+  garbage.insert(garbage.end(), b420.begin(), b420.end());
+  const auto sof_with = [](uint32_t w, uint32_t h, uint8_t hv, uint8_t precision) {
+    JpegBuilder b;
+    b.soi().sof(0xC0, w, h, {{1, static_cast<uint8_t>(hv >> 4), static_cast<uint8_t>(hv & 15), 0}},
+                precision);
+    return b.sos({{1, 0}}).raw({1, 2}).eoi().bytes();
+  };
+  JpegBuilder bad_dri;
+  bad_dri.soi().sof(0xC0, 8, 8, {{1, 1, 1, 0}}).segment(0xDD, {0, 4, 0}).sos({{1, 0}});
+  JpegBuilder no_frame;
+  no_frame.soi().dqt(0).sos({{1, 0}});
+  JpegBuilder length_mismatch;
+  length_mismatch.soi().raw({0xFF, 0xC0, 0, 12, 8, 0, 8, 0, 8, 1, 1, 0x11, 0, 0});
+  length_mismatch.sos({{1, 0}});
+  Bytes prog12 = vjtest::small_progressive(8, 8);
+  prog12[marker_at(prog12, 0xC2) + 4] = 12;
+
+  return {
+      {"Baseline420", b420, 200, {33, 17, 0, 0, 2, 2}},
+      {"Baseline422", vjtest::small_baseline(40, 30, 2, 1), 200, {40, 30, 0, 0, 2, 1}},
+      {"Baseline440", vjtest::small_baseline(40, 30, 1, 2), 200, {40, 30, 0, 0, 1, 2}},
+      {"Baseline411", vjtest::small_baseline(40, 30, 4, 1), 200, {40, 30, 0, 0, 4, 1}},
+      {"Restart", vjtest::small_baseline(64, 64, 1, 1, 5), 200, {64, 64, 0, 5, 1, 1}},
+      {"Progressive", vjtest::small_progressive(17, 33), 200, {17, 33, 1, 0, 0, 0}},
+      {"ExtendedSequential", patched(b420, sof + 1, 0xC1), 200, {33, 17, 0, 0, 2, 2}},
+      {"LeadingGarbage", garbage, 200, {33, 17, 0, 0, 2, 2}},
+      {"NoSoi", patched(b420, 1, 0xD7), 201, {}},
+      {"ScanWithoutFrame", no_frame.bytes(), 201, {}},
+      {"DriLengthFive", bad_dri.bytes(), 201, {8, 8, 0, 0, 1, 1}},
+      {"Precision12", sof_with(8, 8, 0x11, 12), 201, {8, 8}},
+      {"Progressive12Bit", prog12, 201, {8, 8, 1}},
+      {"WidthZero", sof_with(0, 8, 0x11, 8), 201, {0, 8}},
+      {"Height50001", sof_with(8, 50001, 0x11, 8), 201, {8, 50001}},
+      {"Sampling5", sof_with(8, 8, 0x51, 8), 201, {8, 8}},
+      {"SamplingZero", sof_with(8, 8, 0x10, 8), 201, {8, 8}},
+      {"FrameLengthMismatch", length_mismatch.bytes(), 201, {8, 8}},
+      {"Truncated", Bytes(b420.begin(), b420.begin() + static_cast<long>(sof + 12)), 201,
+       {33, 17}},
+  };
+}
+
+class SimpleParserCase : public ::testing::TestWithParam<SummaryCase> {};
+
+TEST_P(SimpleParserCase, ReportsTheSummaryOrFails) {
+  const SummaryCase& c = GetParam();
+  uint32_t result[kSummaryWords] = {};
+  ASSERT_EQ(summarise(c.bytes, result), c.status);
+  for (uint32_t i = 0; i < kSummaryWords; ++i) EXPECT_EQ(result[i], c.words[i]) << "word " << i;
+}
+
+INSTANTIATE_TEST_SUITE_P(Streams, SimpleParserCase, ::testing::ValuesIn(summary_cases()),
+                         [](const auto& p) { return std::string(p.param.name); });
+
+TEST(SimpleParser, AcceptsOnlyModes8And2) {
+  const Bytes b = vjtest::small_baseline(8, 8);
+  for (int32_t mode : {0, 1, 3, 7, 9, -8}) {
+    uint32_t result[kSummaryWords] = {};
+    EXPECT_EQ(summarise(b, result, mode), 201) << mode;
+  }
+  uint32_t result[kSummaryWords] = {};
+  EXPECT_EQ(summarise(b, result, 2), 200);
+}
+
+// A stream ending at exactly `end` bytes with `trailing` bytes after EOI.
+Bytes stream_ending_at(size_t end, size_t trailing) {
+  JpegBuilder body;
+  body.sof(0xC0, 16, 16, {{1, 1, 1, 0}}).sos({{1, 0}}).raw({1, 2, 0xFF, 0, 3}).eoi();
+  // A comment widened so that EOI ends at `end`.
+  JpegBuilder b;
+  b.soi().com(static_cast<uint32_t>(end - body.size() - 6)).raw(body.bytes());
+  Bytes out = b.bytes();
+  out.resize(out.size() + trailing, 0xFF);
+  return out;
+}
+
+TEST(EOIParser, ReportsTheOffsetPastEoiNotTheInputSize) {
+  for (size_t end : {201u, 202u, 5000u, 40000u}) {
+    const Bytes b = stream_ending_at(end, 300);
+    uint32_t offset = 0;
+    uint32_t result[3] = {};
+    ASSERT_EQ(find_end(b, &offset, result), 200) << end;
+    EXPECT_EQ(offset, end);
+    EXPECT_EQ(result[0], 16u);
+    EXPECT_EQ(result[1], 16u);
+    EXPECT_EQ(result[2], 0u);
+  }
+}
+
+TEST(EOIParser, WalksThroughScansAndSkipsEmbeddedStreams) {
+  // A JPEG inside an APP1 segment holds an EOI of its own.
+  const Bytes inner = vjtest::small_baseline(4, 4);
+  JpegBuilder b;
+  b.soi().segment(0xE1, inner);
+  const Bytes p = vjtest::small_progressive(9, 7);
+  b.raw(Bytes(p.begin() + 2, p.end())).raw({0, 0, 0});
+  uint32_t offset = 0;
+  uint32_t result[3] = {};
+  ASSERT_EQ(find_end(b.bytes(), &offset, result), 200);
+  EXPECT_EQ(offset, b.size() - 3);
+  EXPECT_EQ(result[0], 9u);
+  EXPECT_EQ(result[1], 7u);
+  EXPECT_EQ(result[2], 1u);
+
+  Bytes no_eoi = vjtest::small_baseline(8, 8);
+  no_eoi.resize(no_eoi.size() - 2);
+  EXPECT_EQ(find_end(no_eoi, &offset, result), 201);
+}
+
+TEST(Wrappers, StartAtTheJpegOffsetAndReportAbsolutePositions) {
+  Bytes container(100, 0x00);
+  container[10] = 0xFF;  // a decoy SOI and EOI before the JPEG data
+  container[11] = 0xD8;
+  container[12] = 0xFF;
+  container[13] = 0xD9;
+  const Bytes jpeg = vjtest::small_baseline(48, 32, 1, 1, 2);
+  container.insert(container.end(), jpeg.begin(), jpeg.end());
+  container.resize(container.size() + 50, 0xAA);
+  IoStream* s = KOLVAVETA_Open_IO(1, container.data(), static_cast<uint32_t>(container.size()));
+  ASSERT_NE(s, nullptr);
+  JpegInfo info{};
+  info.jpeg_offset = 100;
+  info.reserved8 = 9;
+  ASSERT_EQ(VETAJ_GetHInfo(s, &info), 1);
+  EXPECT_EQ(info.width, 48);
+  EXPECT_EQ(info.height, 32);
+  EXPECT_EQ(info.restart_interval, 2);
+  EXPECT_EQ(info.max_h_samp, 1);
+  EXPECT_EQ(info.max_v_samp, 1);
+  EXPECT_EQ(info.reserved8, 0);
+  EXPECT_EQ(info.jpeg_offset, 100u);
+
+  JpegInfo end_info{};
+  end_info.jpeg_offset = 100;
+  EXPECT_EQ(VETAJ_GetEOIOffset(s, &end_info), 100u + jpeg.size());
+  EXPECT_EQ(end_info.width, 48);
+  EXPECT_EQ(end_info.height, 32);
+
+  end_info.jpeg_offset = 0;
+  EXPECT_EQ(VETAJ_GetEOIOffset(s, &end_info), 14u) << "from the start, the decoy ends first";
+  EXPECT_EQ(VETAJ_GetHInfo(nullptr, &info), 0);
+  EXPECT_EQ(VETAJ_GetEOIOffset(s, nullptr), 0u);
+  KOLVAVETA_Close_IO(s);
+}
+
+// ---------------------------------------------------------------------------
+// KOLVAVETA_JpgParser on every input kind
+
+const InputKind kAllKinds[] = {InputKind::kPath, InputKind::kHandle, InputKind::kMemory,
+                               InputKind::kOwnedMemory, InputKind::kStream};
+
+// A stream whose segments straddle window refills: large comments and an
+// Exif block before the frame.
+Bytes large_stream() {
+  JpegBuilder b;
+  b.soi().com(20000, 0x11).segment(0xE1, Bytes(40000, 0xFF)).com(3, 0xD8);
+  const Bytes body = vjtest::small_baseline(1023, 17, 2, 1, 7);
+  return b.raw(Bytes(body.begin() + 2, body.end())).bytes();
+}
+
+class JpgParserKinds : public ::testing::TestWithParam<InputKind> {};
+
+TEST_P(JpgParserKinds, GiveTheSameSummaryAgainAndAgain) {
+  for (const Bytes& bytes : {vjtest::small_baseline(33, 17, 2, 2, 4), large_stream()}) {
+    InputHolder in(GetParam(), bytes);
+    DecInfo* object = in.object();
+    ASSERT_NE(object, nullptr);
+    for (int round = 0; round < 2; ++round) {
+      JpegInfo info;
+      std::memset(&info, 0x7F, sizeof info);
+      ASSERT_EQ(KOLVAVETA_JpgParser(object, &info), 1);
+      EXPECT_EQ(gKOLVAVETA_Error, 0);
+      const bool large = bytes.size() > 20000;
+      EXPECT_EQ(info.width, large ? 1023 : 33);
+      EXPECT_EQ(info.height, 17);
+      EXPECT_EQ(info.input_size, bytes.size());
+      EXPECT_EQ(info.image_count, 1);
+      EXPECT_EQ(info.progressive, 0);
+      EXPECT_EQ(info.restart_interval, large ? 7 : 4);
+      EXPECT_EQ(info.max_h_samp, 2);
+      EXPECT_EQ(info.max_v_samp, large ? 1 : 2);
+      EXPECT_EQ(info.reserved8, 0);
+      EXPECT_EQ(info.reserved[0], 0);
+      EXPECT_EQ(info.jpeg_offset, 0u);
+      EXPECT_EQ(object->image_width, info.width);
+      EXPECT_EQ(object->image_height, info.height);
+    }
+  }
+}
+
+TEST_P(JpgParserKinds, RefuseWhatIsNotAReadableJpegHeader) {
+  const Bytes png{0x89, 'P', 'N', 'G', 0x0D, 0x0A, 0x1A, 0x0A, 0, 0, 0, 13, 'I', 'H', 'D', 'R',
+                  0, 0, 0, 16, 0, 0, 0, 16, 8, 2, 0, 0, 0};
+  Bytes twelve = vjtest::small_baseline(8, 8);
+  twelve[marker_at(twelve, 0xC0) + 4] = 12;
+  for (const Bytes& bytes : {png, twelve}) {
+    InputHolder in(GetParam(), bytes);
+    ASSERT_NE(in.object(), nullptr);
+    JpegInfo info{};
+    EXPECT_EQ(KOLVAVETA_JpgParser(in.object(), &info), 0);
+    EXPECT_EQ(gKOLVAVETA_Error, 5);
+    EXPECT_EQ(info.width, 0);
+    EXPECT_EQ(in.object()->image_width, 0);
+  }
+}
+
+INSTANTIATE_TEST_SUITE_P(Inputs, JpgParserKinds, ::testing::ValuesIn(kAllKinds),
+                         [](const auto& p) { return vjtest::input_kind_name(p.param); });
+
+TEST(JpgParser, NullObjectSetsError1) {
+  JpegInfo info{};
+  EXPECT_EQ(KOLVAVETA_JpgParser(nullptr, &info), 0);
+  EXPECT_EQ(gKOLVAVETA_Error, 1);
+}
+
+// Every prefix of a stream, read through a memory block and a caller
+// stream, gives a summary only once the scan header has begun.
+TEST(Scanners, TruncatedCopiesNeverCrash) {
+  for (const Bytes& full : {vjtest::small_baseline(33, 17), vjtest::small_progressive(8, 8)}) {
+    const size_t sos = marker_at(full, 0xDA);
+    for (size_t n = 1; n <= full.size(); ++n) {
+      const Bytes cut(full.begin(), full.begin() + static_cast<long>(n));
+      for (InputKind kind : {InputKind::kMemory, InputKind::kStream}) {
+        InputHolder in(kind, cut);
+        JpegInfo info{};
+        EXPECT_EQ(KOLVAVETA_JpgParser(in.object(), &info), n >= sos + 2 ? 1 : 0) << n;
+        info = JpegInfo{};
+        const uint32_t end = VETAJ_GetEOIOffset(in.object()->stream, &info);
+        EXPECT_EQ(end, n == full.size() ? full.size() : 0u) << n;
+      }
+    }
+  }
+}
+
+}  // namespace
