@@ -16,30 +16,14 @@ using vjtest::InputHolder;
 using vjtest::InputKind;
 using vjtest::JpegBuilder;
 
-// Runs the summary scanner over a memory block.
 int32_t summarise(const Bytes& bytes, uint32_t result[kSummaryWords], int32_t mode = 8) {
-  IoStream* s = KOLVAVETA_Open_IO(1, const_cast<uint8_t*>(bytes.data()),
-                                  static_cast<uint32_t>(bytes.size()));
-  if (s == nullptr) return -1;
-  StreamWindow w;
-  vj::window_open(&w, s);
-  const int32_t status = VETAJ_SimpleParser(&w, mode, result);
-  vj::window_close(&w);
-  KOLVAVETA_Close_IO(s);
-  return status;
+  return vjtest::on_memory_window(
+      bytes, [&](StreamWindow* w) { return VETAJ_SimpleParser(w, mode, result); });
 }
 
-// Runs the end-of-data scanner over a memory block; returns its status.
 int32_t find_end(const Bytes& bytes, uint32_t* end, uint32_t result[3]) {
-  IoStream* s = KOLVAVETA_Open_IO(1, const_cast<uint8_t*>(bytes.data()),
-                                  static_cast<uint32_t>(bytes.size()));
-  if (s == nullptr) return -1;
-  StreamWindow w;
-  vj::window_open(&w, s);
-  const int32_t status = VETAJ_EOIParser(&w, 8, result, end);
-  vj::window_close(&w);
-  KOLVAVETA_Close_IO(s);
-  return status;
+  return vjtest::on_memory_window(
+      bytes, [&](StreamWindow* w) { return VETAJ_EOIParser(w, 8, result, end); });
 }
 
 Bytes patched(Bytes b, size_t at, uint8_t value) {

@@ -461,17 +461,25 @@ TEST(ParseNextMarker, RefusesADecoderWithoutWindowOrMarkerState) {
 // ---------------------------------------------------------------------------
 // File-header pre-scan
 
-// Runs the pre-scan over a memory block; returns its status.
 int32_t prescan(const Bytes& bytes, FileHeaderInfo* h, int32_t mode = 8) {
-  IoStream* s = KOLVAVETA_Open_IO(1, const_cast<uint8_t*>(bytes.data()),
-                                  static_cast<uint32_t>(bytes.size()));
-  if (s == nullptr) return -1;
-  StreamWindow w;
-  vj::window_open(&w, s);
-  const int32_t status = VETAJ_ParseFileHeader(&w, mode, h);
-  vj::window_close(&w);
-  KOLVAVETA_Close_IO(s);
-  return status;
+  return vjtest::on_memory_window(
+      bytes, [&](StreamWindow* w) { return VETAJ_ParseFileHeader(w, mode, h); });
+}
+
+// The thumbnail fields a test expects.
+struct Thumb {
+  int32_t width, height, format, colour;
+  uint32_t length, offset;
+};
+
+void expect_thumbnail(const ThumbnailInfo& t, const Thumb& e) {
+  EXPECT_EQ(t.present, 1);
+  EXPECT_EQ(t.width, e.width);
+  EXPECT_EQ(t.height, e.height);
+  EXPECT_EQ(t.format, e.format);
+  EXPECT_EQ(t.colour, e.colour);
+  EXPECT_EQ(t.length, e.length);
+  EXPECT_EQ(t.offset, e.offset);
 }
 
 // A stream with the given APP segments before a 640x480 baseline frame.
@@ -540,20 +548,13 @@ TEST(ParseFileHeader, FindsAJfifThumbnail) {
   const Bytes stream = with_app({{0xE0, jfif(1, 2, 2, 12)}});
   FileHeaderInfo h{};
   ASSERT_EQ(prescan(stream, &h), 200);
-  const ThumbnailInfo& t = h.thumbnail;
-  EXPECT_EQ(t.present, 1);
-  EXPECT_EQ(t.format, 1);
-  EXPECT_EQ(t.colour, 2);
-  EXPECT_EQ(t.length, 12u);
-  EXPECT_EQ(t.width, 2);
-  EXPECT_EQ(t.height, 2);
-  EXPECT_EQ(t.offset, 2u + 4u + 14u) << "SOI, marker and length, JFIF header";
-  EXPECT_EQ(stream[t.offset], 0x80);
+  // SOI, marker and length, JFIF header.
+  expect_thumbnail(h.thumbnail, {2, 2, 1, 2, 12, 2 + 4 + 14});
+  EXPECT_EQ(stream[h.thumbnail.offset], 0x80);
 
   FileHeaderInfo v2{};
   ASSERT_EQ(prescan(with_app({{0xE0, jfif(2, 3, 1, 9)}}), &v2), 200);
-  EXPECT_EQ(v2.thumbnail.present, 1);
-  EXPECT_EQ(v2.thumbnail.length, 9u);
+  expect_thumbnail(v2.thumbnail, {3, 1, 1, 2, 9, 2 + 4 + 14});
 
   for (const Bytes& payload : {jfif(1, 2, 2, 11), jfif(1, 0, 2, 0), jfif(1, 2, 2, 13)}) {
     FileHeaderInfo n{};
@@ -574,10 +575,7 @@ TEST(ParseFileHeader, FindsJfxxThumbnails) {
     const Bytes stream = with_app({{0xE0, jfxx(0x10, embedded)}});
     FileHeaderInfo h{};
     ASSERT_EQ(prescan(stream, &h), 200);
-    EXPECT_EQ(h.thumbnail.present, 1);
-    EXPECT_EQ(h.thumbnail.format, 6);
-    EXPECT_EQ(h.thumbnail.length, 4u);
-    EXPECT_EQ(h.thumbnail.offset, 2u + 4u + 6u);
+    expect_thumbnail(h.thumbnail, {0, 0, 6, 0, 4, 2 + 4 + 6});
   }
   {
     Bytes rgb{3, 2};
@@ -585,21 +583,14 @@ TEST(ParseFileHeader, FindsJfxxThumbnails) {
     const Bytes stream = with_app({{0xE0, jfxx(0x13, rgb)}});
     FileHeaderInfo h{};
     ASSERT_EQ(prescan(stream, &h), 200);
-    EXPECT_EQ(h.thumbnail.present, 1);
-    EXPECT_EQ(h.thumbnail.format, 1);
-    EXPECT_EQ(h.thumbnail.colour, 2);
-    EXPECT_EQ(h.thumbnail.width, 3);
-    EXPECT_EQ(h.thumbnail.height, 2);
-    EXPECT_EQ(h.thumbnail.length, 18u);
-    EXPECT_EQ(h.thumbnail.offset, 2u + 4u + 8u);
+    expect_thumbnail(h.thumbnail, {3, 2, 1, 2, 18, 2 + 4 + 8});
   }
   {
     Bytes palette{2, 2};
     palette.resize(2 + 768 + 4, 0x01);
     FileHeaderInfo h{};
     ASSERT_EQ(prescan(with_app({{0xE0, jfxx(0x11, palette)}}), &h), 200);
-    EXPECT_EQ(h.thumbnail.present, 1);
-    EXPECT_EQ(h.thumbnail.length, 768u + 4u);
+    expect_thumbnail(h.thumbnail, {2, 2, 1, 2, 768 + 4, 2 + 4 + 8});
   }
   // Sizes that do not match the data, and unknown extension codes, are no thumbnail.
   for (const Bytes& payload : {jfxx(0x13, {3, 2, 1, 2, 3}), jfxx(0x11, {1, 1, 0}),
@@ -678,16 +669,10 @@ TEST_P(ExifThumbnail, IsLocatedFromIfd1) {
   const Bytes stream = with_app({{0xE1, exif(big, ifd1, 8, padding)}}, 600);
   FileHeaderInfo h{};
   ASSERT_EQ(prescan(stream, &h), 200);
-  const ThumbnailInfo& t = h.thumbnail;
-  EXPECT_EQ(t.present, 1);
-  EXPECT_EQ(t.width, 160);
-  EXPECT_EQ(t.height, 120);
-  EXPECT_EQ(t.format, 6);
-  EXPECT_EQ(t.colour, 2);
-  EXPECT_EQ(t.planar, 1);
-  EXPECT_EQ(t.vendor, 9);
-  EXPECT_EQ(t.length, 400u);
-  EXPECT_EQ(t.offset, 2u + 4u + 6u + 30u) << "relative to the TIFF header";
+  // The offset counts from the TIFF header.
+  expect_thumbnail(h.thumbnail, {160, 120, 6, 2, 400, 2 + 4 + 6 + 30});
+  EXPECT_EQ(h.thumbnail.planar, 1);
+  EXPECT_EQ(h.thumbnail.vendor, 9);
 }
 
 INSTANTIATE_TEST_SUITE_P(ByteOrders, ExifThumbnail,
@@ -697,10 +682,7 @@ TEST(ParseFileHeader, UncompressedExifThumbnailUsesStrips) {
   const std::vector<IfdEntry> ifd1{{0x103, 3, 1}, {0x111, 4, 40}, {0x117, 4, 48}};
   FileHeaderInfo h{};
   ASSERT_EQ(prescan(with_app({{0xE1, exif(false, ifd1)}}), &h), 200);
-  EXPECT_EQ(h.thumbnail.present, 1);
-  EXPECT_EQ(h.thumbnail.format, 0);
-  EXPECT_EQ(h.thumbnail.length, 48u);
-  EXPECT_EQ(h.thumbnail.offset, 12u + 40u);
+  expect_thumbnail(h.thumbnail, {0, 0, 0, 0, 48, 12 + 40});
 }
 
 TEST(ParseFileHeader, MalformedExifIsSkippedWithoutAThumbnail) {
@@ -771,16 +753,10 @@ TEST(ParseFileHeader, FindsAnImageResourceThumbnail) {
   const Bytes stream = with_app({{0xED, app13}});
   FileHeaderInfo h{};
   ASSERT_EQ(prescan(stream, &h), 200);
-  const ThumbnailInfo& t = h.thumbnail;
-  EXPECT_EQ(t.present, 1);
-  EXPECT_EQ(t.format, 7);
-  EXPECT_EQ(t.width, 80);
-  EXPECT_EQ(t.height, 60);
-  EXPECT_EQ(t.length, 50u);
   // SOI, marker and length, signature, the first resource (4+2+4+4+8), the
   // second's head (4+2+2+4), the 28-byte thumbnail header.
-  EXPECT_EQ(t.offset, 2u + 4u + 14u + 22u + 12u + 28u);
-  EXPECT_EQ(stream[t.offset], 0xCC);
+  expect_thumbnail(h.thumbnail, {80, 60, 7, 0, 50, 2 + 4 + 14 + 22 + 12 + 28});
+  EXPECT_EQ(stream[h.thumbnail.offset], 0xCC);
 
   FileHeaderInfo raw{};
   ASSERT_EQ(prescan(with_app({{0xED, photoshop({resource(0x040C, "x", thumb_resource(0, 8, 8))})}}),

@@ -8,7 +8,6 @@
 namespace {
 
 using vj::kStatusFail;
-using vj::kStatusOk;
 
 // Bounds-checked reads from a TIFF structure held in memory.
 struct TiffView {
@@ -273,41 +272,24 @@ bool read_thumbnail_segment(StreamWindow* w, uint32_t code, ThumbnailInfo* work,
 int32_t VETAJ_ParseFileHeader(StreamWindow* w, int32_t mode, FileHeaderInfo* header) {
   if (w == nullptr || header == nullptr) return kStatusFail;
   ThumbnailInfo work = header->thumbnail;
-  if (!vj::scan_to_soi(w, mode)) return kStatusFail;
-  for (;;) {
-    const int32_t code = vj::next_marker(w);
-    if (code < 0) return kStatusFail;
-    switch (static_cast<uint32_t>(code)) {
+  return vj::walk_markers(w, mode, [&](uint32_t code) {
+    switch (code) {
       case vj::kMarkerSof2:
         header->progressive = 1;
         [[fallthrough]];
-      case vj::kMarkerSof0: {
-        vj::FrameSize f;
-        f.width = static_cast<uint32_t>(header->width);
-        f.height = static_cast<uint32_t>(header->height);
-        const bool ok = vj::read_frame_size(w, false, &f);
-        header->width = static_cast<int32_t>(f.width);
-        header->height = static_cast<int32_t>(f.height);
-        if (!ok) return kStatusFail;
-        break;
-      }
+      case vj::kMarkerSof0:
+        // A repeated frame header is read again.
+        return vj::read_frame_size_into(w, &header->width, &header->height) ? vj::Step::kNext
+                                                                            : vj::Step::kFail;
       case vj::kMarkerSos:
-        return kStatusOk;
+        return vj::Step::kDone;
       case vj::kMarkerApp0:
       case vj::kMarkerApp1:
       case vj::kMarkerApp13:
-        if (!read_thumbnail_segment(w, static_cast<uint32_t>(code), &work, &header->thumbnail))
-          return kStatusFail;
-        break;
-      case vj::kMarkerDht:
-      case vj::kMarkerDqt:
-      case vj::kMarkerDri:
-        if (!vj::skip_segment(w)) return kStatusFail;
-        break;
+        return read_thumbnail_segment(w, code, &work, &header->thumbnail) ? vj::Step::kNext
+                                                                          : vj::Step::kFail;
       default:
-        if (vj::is_skippable_segment(static_cast<uint32_t>(code)) && !vj::skip_segment(w))
-          return kStatusFail;
-        break;
+        return vj::Step::kPass;
     }
-  }
+  });
 }

@@ -34,6 +34,12 @@ bool skip_segment(StreamWindow* w) {
   return skip_bytes(w, length - 2);
 }
 
+bool pass_over(StreamWindow* w, uint32_t code) {
+  const bool segment = code == kMarkerDht || code == kMarkerDqt || code == kMarkerDri ||
+                       is_skippable_segment(code);
+  return !segment || skip_segment(w);
+}
+
 int32_t next_marker(StreamWindow* w) {
   for (;;) {
     int32_t b = window_byte(w);

@@ -59,6 +59,12 @@ bool skip_bytes(StreamWindow* w, uint32_t n);
 // length below 2 or when the input ends first.
 bool skip_segment(StreamWindow* w);
 
+// Passes over the segment of a marker that the caller does not read: table,
+// restart-interval, APPn, COM and DNL segments are skipped by their length;
+// every other code carries no segment. False for a bad length or when the
+// input ends first.
+bool pass_over(StreamWindow* w, uint32_t code);
+
 // Reads up to and including the next marker code: bytes before a 0xFF are
 // passed over and any run of 0xFF fill bytes is accepted. Returns the code,
 // or -1 at the end of input.
@@ -106,6 +112,50 @@ struct FrameSize {
 // match the component count and every sampling factor must lie in 1..4;
 // max_h and max_v then receive the largest. Returns false on any failure.
 bool read_frame_size(StreamWindow* w, bool sampling, FrameSize* out);
+
+// read_frame_size without sampling, storing the size in two words of the
+// caller's record (left as they are when the input ends before the size).
+template <class T>
+bool read_frame_size_into(StreamWindow* w, T* width, T* height) {
+  FrameSize f;
+  f.width = static_cast<uint32_t>(*width);
+  f.height = static_cast<uint32_t>(*height);
+  const bool ok = read_frame_size(w, false, &f);
+  *width = static_cast<T>(f.width);
+  *height = static_cast<T>(f.height);
+  return ok;
+}
+
+// What a scanner's marker handler asks of the walk.
+enum class Step {
+  kNext,  // the marker was handled: search for the next one
+  kPass,  // not handled: pass over its segment (see pass_over)
+  kDone,  // finished: the walk returns 200
+  kFail,  // the walk returns 201
+};
+
+// The walk shared by the light scanners: checks the mode, finds SOI, then
+// hands every marker code to `handle` (uint32_t code -> Step). Input running
+// out returns 201.
+template <class Handler>
+int32_t walk_markers(StreamWindow* w, int32_t mode, Handler handle) {
+  if (!scan_to_soi(w, mode)) return kStatusFail;
+  for (;;) {
+    const int32_t code = next_marker(w);
+    if (code < 0) return kStatusFail;
+    switch (handle(static_cast<uint32_t>(code))) {
+      case Step::kNext:
+        break;
+      case Step::kPass:
+        if (!pass_over(w, static_cast<uint32_t>(code))) return kStatusFail;
+        break;
+      case Step::kDone:
+        return kStatusOk;
+      case Step::kFail:
+        return kStatusFail;
+    }
+  }
+}
 
 }  // namespace vj
 

@@ -5,18 +5,7 @@
 
 namespace {
 
-using vj::kStatusFail;
-using vj::kStatusOk;
-
-// Reads a frame header into the width/height words of `result`.
-bool read_frame_words(StreamWindow* w, bool sampling, uint32_t* result, vj::FrameSize* f) {
-  f->width = result[kSummaryWidth];
-  f->height = result[kSummaryHeight];
-  const bool ok = vj::read_frame_size(w, sampling, f);
-  result[kSummaryWidth] = f->width;
-  result[kSummaryHeight] = f->height;
-  return ok;
-}
+using vj::Step;
 
 // A window on `stream` positioned at the JPEG data. False when there is no
 // buffer or the stream refuses the seek.
@@ -30,82 +19,66 @@ bool open_at(StreamWindow* w, IoStream* stream, uint32_t offset) {
 }  // namespace
 
 int32_t VETAJ_SimpleParser(StreamWindow* w, int32_t mode, uint32_t result[kSummaryWords]) {
-  if (!vj::scan_to_soi(w, mode)) return kStatusFail;
   bool have_frame = false;
-  for (;;) {
-    const int32_t code = vj::next_marker(w);
-    if (code < 0) return kStatusFail;
-    switch (static_cast<uint32_t>(code)) {
+  return vj::walk_markers(w, mode, [&](uint32_t code) {
+    switch (code) {
       case vj::kMarkerSof0:
       case vj::kMarkerSof1: {
         vj::FrameSize f;
-        if (!read_frame_words(w, true, result, &f)) return kStatusFail;
+        f.width = result[kSummaryWidth];
+        f.height = result[kSummaryHeight];
+        const bool ok = vj::read_frame_size(w, true, &f);
+        result[kSummaryWidth] = f.width;
+        result[kSummaryHeight] = f.height;
+        if (!ok) return Step::kFail;
         result[kSummaryMaxH] = f.max_h;
         result[kSummaryMaxV] = f.max_v;
         have_frame = true;
-        break;
+        return Step::kNext;
       }
-      case vj::kMarkerSof2: {
+      case vj::kMarkerSof2:
         result[kSummaryProgressive] = 1;
-        vj::FrameSize f;
-        if (!read_frame_words(w, false, result, &f)) return kStatusFail;
         have_frame = true;
-        break;
-      }
+        return vj::read_frame_size_into(w, &result[kSummaryWidth], &result[kSummaryHeight])
+                   ? Step::kNext
+                   : Step::kFail;
       case vj::kMarkerDri: {
         uint32_t length = 0, interval = 0;
-        if (!vj::read_be16(w, &length) || length != 4) return kStatusFail;
-        if (!vj::read_be16(w, &interval)) return kStatusFail;
+        if (!vj::read_be16(w, &length) || length != 4 || !vj::read_be16(w, &interval))
+          return Step::kFail;
         result[kSummaryRestart] = interval;
-        break;
+        return Step::kNext;
       }
       case vj::kMarkerSos:
         // A scan without a frame header we can read (none, or another frame
         // type) has no summary to give.
-        return have_frame ? kStatusOk : kStatusFail;
-      case vj::kMarkerDht:
-      case vj::kMarkerDqt:
-        if (!vj::skip_segment(w)) return kStatusFail;
-        break;
+        return have_frame ? Step::kDone : Step::kFail;
       default:
-        if (vj::is_skippable_segment(static_cast<uint32_t>(code)) && !vj::skip_segment(w))
-          return kStatusFail;
-        break;
+        return Step::kPass;
     }
-  }
+  });
 }
 
 int32_t VETAJ_EOIParser(StreamWindow* w, int32_t mode, uint32_t result[3],
                         uint32_t* end_offset) {
-  if (!vj::scan_to_soi(w, mode)) return kStatusFail;
-  for (;;) {
-    const int32_t code = vj::next_marker(w);
-    if (code < 0) return kStatusFail;
-    switch (static_cast<uint32_t>(code)) {
+  return vj::walk_markers(w, mode, [&](uint32_t code) {
+    switch (code) {
       case vj::kMarkerSof2:
         result[kSummaryProgressive] = 1;
         [[fallthrough]];
-      case vj::kMarkerSof0: {
-        vj::FrameSize f;
-        if (!read_frame_words(w, false, result, &f)) return kStatusFail;
-        break;
-      }
-      case vj::kMarkerDht:
-      case vj::kMarkerDqt:
-      case vj::kMarkerDri:
-        if (!vj::skip_segment(w)) return kStatusFail;
-        break;
+      case vj::kMarkerSof0:
+        return vj::read_frame_size_into(w, &result[kSummaryWidth], &result[kSummaryHeight])
+                   ? Step::kNext
+                   : Step::kFail;
       case vj::kMarkerEoi:
         *end_offset = vj::window_tell(w);
-        return kStatusOk;
+        return Step::kDone;
       default:
-        // SOS, RSTn and stuffed bytes inside the entropy-coded data are
-        // passed over by the byte scan.
-        if (vj::is_skippable_segment(static_cast<uint32_t>(code)) && !vj::skip_segment(w))
-          return kStatusFail;
-        break;
+        // SOS, RSTn and stuffed bytes inside the entropy-coded data carry no
+        // segment: the byte scan goes on through the data.
+        return Step::kPass;
     }
-  }
+  });
 }
 
 int32_t VETAJ_GetHInfo(IoStream* stream, JpegInfo* info) {
@@ -115,7 +88,7 @@ int32_t VETAJ_GetHInfo(IoStream* stream, JpegInfo* info) {
   uint32_t result[kSummaryWords] = {};
   const int32_t status = VETAJ_SimpleParser(&w, 8, result);
   vj::window_close(&w);
-  if (status == kStatusFail) return 0;
+  if (status != vj::kStatusOk) return 0;
   info->width = static_cast<int32_t>(result[kSummaryWidth]);
   info->height = static_cast<int32_t>(result[kSummaryHeight]);
   info->progressive = static_cast<int32_t>(result[kSummaryProgressive]);
@@ -134,7 +107,7 @@ uint32_t VETAJ_GetEOIOffset(IoStream* stream, JpegInfo* info) {
   uint32_t end = 0;
   const int32_t status = VETAJ_EOIParser(&w, 8, result, &end);
   vj::window_close(&w);
-  if (status == kStatusFail) return 0;
+  if (status != vj::kStatusOk) return 0;
   info->width = static_cast<int32_t>(result[kSummaryWidth]);
   info->height = static_cast<int32_t>(result[kSummaryHeight]);
   info->progressive = static_cast<int32_t>(result[kSummaryProgressive]);

@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "VetaJpegDecoder.h"
+#include "io/stream.h"
 #include "support/files.h"
 
 namespace vjtest {
@@ -60,6 +61,21 @@ Bytes small_baseline(uint32_t width, uint32_t height, uint8_t h = 2, uint8_t v =
                      uint32_t restart = 0);
 // The same frame as a progressive stream with a DC scan and one AC scan.
 Bytes small_progressive(uint32_t width, uint32_t height);
+
+// Runs fn(StreamWindow*) on a fresh window over a memory stream of `bytes`
+// and returns its result, or -1 when the stream cannot be opened.
+template <class F>
+int32_t on_memory_window(const Bytes& bytes, F fn) {
+  IoStream* s = KOLVAVETA_Open_IO(1, const_cast<uint8_t*>(bytes.data()),
+                                  static_cast<uint32_t>(bytes.size()));
+  if (s == nullptr) return -1;
+  StreamWindow w;
+  vj::window_open(&w, s);
+  const int32_t result = fn(&w);
+  vj::window_close(&w);
+  KOLVAVETA_Close_IO(s);
+  return result;
+}
 
 // A caller stream over a byte vector, reached through the three callbacks.
 struct CallbackSource {
