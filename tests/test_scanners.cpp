@@ -1,11 +1,15 @@
 // The quick stream scanners and the JPEG header summary call.
 #include <gtest/gtest.h>
 
+#include <cctype>
 #include <cstring>
 #include <string>
 #include <vector>
 
 #include "io/stream.h"
+#include "support/files.h"
+#include "support/manifest.h"
+#include "support/oracle.h"
 #include "support/segments.h"
 #include "syntax/scanners.h"
 
@@ -279,6 +283,133 @@ TEST(Scanners, TruncatedCopiesNeverCrash) {
         const uint32_t end = VETAJ_GetEOIOffset(in.object()->stream, &info);
         EXPECT_EQ(end, n == full.size() ? full.size() : 0u) << n;
       }
+    }
+  }
+}
+
+// ---------------------------------------------------------------------------
+// The fixture corpus
+
+bool starts_with(const std::string& s, const char* prefix) { return s.rfind(prefix, 0) == 0; }
+
+// The summary words a caller sees, in one comparable record.
+std::vector<int32_t> words(const JpegInfo& info) {
+  std::vector<int32_t> w(13);
+  std::memcpy(w.data(), &info, sizeof info);
+  return w;
+}
+
+class CorpusSummary : public ::testing::TestWithParam<std::string> {};
+
+TEST_P(CorpusSummary, AgreesWithTheOracleOnEveryInputKind) {
+  const std::string name = GetParam();
+  const Bytes bytes = vjtest::read_fixture(name);
+  ASSERT_FALSE(bytes.empty());
+  InputHolder memory(InputKind::kMemory, bytes);
+  JpegInfo reference{};
+  const int32_t ok = KOLVAVETA_JpgParser(memory.object(), &reference);
+  // 12-bit and arithmetic-coded frames have no summary; an extended
+  // sequential frame is read like a baseline one.
+  const bool refused = starts_with(name, "bad_") && name.find("sof1") == std::string::npos;
+  ASSERT_EQ(ok, refused ? 0 : 1);
+  if (refused) {
+    EXPECT_EQ(gKOLVAVETA_Error, 5);
+  }
+#if VETAJ_HAVE_LIBJPEG
+  vjtest::OracleHeader o;
+  if (ok == 1) {
+    ASSERT_TRUE(vjtest::oracle_header(bytes, &o));
+    EXPECT_EQ(reference.width, o.width);
+    EXPECT_EQ(reference.height, o.height);
+    EXPECT_EQ(reference.progressive, o.progressive);
+    EXPECT_EQ(reference.restart_interval, o.restart_interval);
+    // The summary gives the sampling factors of sequential frames only.
+    EXPECT_EQ(reference.max_h_samp, o.progressive ? 0 : o.max_h);
+    EXPECT_EQ(reference.max_v_samp, o.progressive ? 0 : o.max_v);
+  }
+#endif
+  for (InputKind kind : kAllKinds) {
+    InputHolder in(kind, bytes);
+    ASSERT_NE(in.object(), nullptr);
+    JpegInfo info{};
+    EXPECT_EQ(KOLVAVETA_JpgParser(in.object(), &info), ok) << vjtest::input_kind_name(kind);
+    EXPECT_EQ(words(info), words(reference)) << vjtest::input_kind_name(kind);
+  }
+}
+
+TEST_P(CorpusSummary, EndOffsetIsWhereTheJpegDataEnds) {
+  const std::string name = GetParam();
+  const Bytes bytes = vjtest::read_fixture(name);
+  const vjtest::ManifestEntry* entry = vjtest::manifest_entry(name);
+  ASSERT_NE(entry, nullptr);
+  uint32_t expected = static_cast<uint32_t>(bytes.size());
+  if (name.find("12bit") != std::string::npos) expected = 0;  // not an 8-bit frame
+  if (entry->fields.count("patch") != 0 && entry->fields.at("patch") == "300_bytes_after_EOI")
+    expected -= 300;
+  for (InputKind kind : {InputKind::kMemory, InputKind::kStream, InputKind::kPath}) {
+    InputHolder in(kind, bytes);
+    JpegInfo info{};
+    EXPECT_EQ(VETAJ_GetEOIOffset(in.object()->stream, &info), expected)
+        << vjtest::input_kind_name(kind);
+  }
+}
+
+INSTANTIATE_TEST_SUITE_P(Fixtures, CorpusSummary,
+                         ::testing::ValuesIn(vjtest::list_fixtures(".jpg")),
+                         [](const auto& p) {
+                           std::string n = p.param.substr(0, p.param.size() - 4);
+                           for (char& c : n)
+                             if (!std::isalnum(static_cast<unsigned char>(c))) c = '_';
+                           return n;
+                         });
+
+TEST(CorpusContainers, JpegInsideTiffIsReadAtItsOffset) {
+  const auto names = vjtest::list_fixtures(".tif");
+  ASSERT_FALSE(names.empty());
+  for (const std::string& name : names) {
+    const Bytes bytes = vjtest::read_fixture(name);
+    const vjtest::ManifestEntry* entry = vjtest::manifest_entry(name);
+    ASSERT_NE(entry, nullptr) << name;
+    const uint32_t offset = static_cast<uint32_t>(entry->number("jpeg_offset"));
+    const uint32_t length = static_cast<uint32_t>(entry->number("jpeg_length"));
+    ASSERT_GT(offset, 0u);
+    InputHolder in(InputKind::kMemory, bytes);
+    JpegInfo info{};
+    info.jpeg_offset = offset;
+    ASSERT_EQ(VETAJ_GetHInfo(in.object()->stream, &info), 1) << name;
+    EXPECT_EQ(info.width, 64);
+    EXPECT_EQ(info.height, 48);
+    EXPECT_EQ(info.max_h_samp, 2);
+    JpegInfo end{};
+    end.jpeg_offset = offset;
+    EXPECT_EQ(VETAJ_GetEOIOffset(in.object()->stream, &end), offset + length) << name;
+  }
+}
+
+// Truncated copies of every fixture: never a crash, and a summary or end
+// offset only when it is the whole file's.
+TEST(CorpusTruncation, SummariesOfTruncatedCopiesAreAllOrNothing) {
+  for (const std::string& name : vjtest::list_fixtures(".jpg")) {
+    const Bytes full = vjtest::read_fixture(name);
+    InputHolder whole(InputKind::kMemory, full);
+    JpegInfo expected{};
+    const int32_t full_ok = KOLVAVETA_JpgParser(whole.object(), &expected);
+    JpegInfo end_info{};
+    const uint32_t full_end = VETAJ_GetEOIOffset(whole.object()->stream, &end_info);
+    size_t i = 0;
+    for (size_t n : vjtest::cut_lengths(full.size(), 400, 40)) {
+      const Bytes cut(full.begin(), full.begin() + static_cast<long>(n));
+      const InputKind kind = (i++ % 5 == 0) ? InputKind::kStream : InputKind::kMemory;
+      InputHolder in(kind, cut);
+      JpegInfo info{};
+      if (KOLVAVETA_JpgParser(in.object(), &info) == 1) {
+        EXPECT_EQ(full_ok, 1) << name << " at " << n;
+        info.input_size = expected.input_size;
+        EXPECT_EQ(words(info), words(expected)) << name << " at " << n;
+      }
+      JpegInfo e{};
+      const uint32_t end = VETAJ_GetEOIOffset(in.object()->stream, &e);
+      EXPECT_EQ(end, n >= full_end && full_end != 0 ? full_end : 0u) << name << " at " << n;
     }
   }
 }

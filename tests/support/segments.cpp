@@ -122,6 +122,17 @@ Bytes small_progressive(uint32_t width, uint32_t height) {
   return b.bytes();
 }
 
+std::vector<size_t> cut_lengths(size_t size, size_t dense, size_t spread) {
+  std::vector<size_t> out;
+  for (size_t n = 1; n <= size && n <= dense; ++n) out.push_back(n);
+  if (size > dense) {
+    const size_t step = (size - dense) / spread + 1;
+    for (size_t n = dense + step; n + 8 < size; n += step) out.push_back(n);
+    for (size_t n = size > dense + 8 ? size - 8 : dense + 1; n <= size; ++n) out.push_back(n);
+  }
+  return out;
+}
+
 int32_t CallbackSource::read(void* self, void* buffer, uint32_t count) {
   auto* s = static_cast<CallbackSource*>(self);
   const uint32_t size = static_cast<uint32_t>(s->data.size());

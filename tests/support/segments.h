@@ -77,6 +77,11 @@ int32_t on_memory_window(const Bytes& bytes, F fn) {
   return result;
 }
 
+// Lengths at which truncation sweeps cut a stream of `size` bytes: every
+// length up to `dense`, then a spread of lengths up to the whole, and the
+// last few.
+std::vector<size_t> cut_lengths(size_t size, size_t dense = 700, size_t spread = 60);
+
 // A caller stream over a byte vector, reached through the three callbacks.
 struct CallbackSource {
   Bytes data;
