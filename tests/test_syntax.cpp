@@ -1,7 +1,9 @@
 // The decoder's marker reader and the file-header pre-scan.
 #include <gtest/gtest.h>
 
+#include <cctype>
 #include <cstring>
+#include <map>
 #include <functional>
 #include <string>
 #include <tuple>
@@ -9,6 +11,9 @@
 
 #include "drivers/decoder.h"
 #include "io/stream.h"
+#include "support/files.h"
+#include "support/manifest.h"
+#include "support/oracle.h"
 #include "support/segments.h"
 #include "syntax/markers.h"
 
@@ -542,6 +547,9 @@ TEST(ParseFileHeader, RefusesBadModesMissingSoiAndMalformedSegments) {
   JpegBuilder e;
   e.soi().sof(0xC0, 8, 8, {{1, 1, 1, 0}}).eoi();
   EXPECT_EQ(prescan(e.bytes(), &h), 201) << "no scan";
+  JpegBuilder f;
+  f.soi().sof(0xC1, 8, 8, {{1, 1, 1, 0}}).sos({{1, 0}});
+  EXPECT_EQ(prescan(f.bytes(), &h), 201) << "no baseline or progressive frame";
 }
 
 TEST(ParseFileHeader, FindsAJfifThumbnail) {
@@ -800,6 +808,187 @@ TEST(ParseFileHeader, TruncatedStreamsFailCleanly) {
     const Bytes cut(full.begin(), full.begin() + static_cast<long>(n));
     const int32_t status = n == 0 ? 201 : prescan(cut, &h);
     EXPECT_EQ(status, n >= sos + 2 ? 200 : 201) << "prefix " << n;
+  }
+}
+
+// ---------------------------------------------------------------------------
+// The fixture corpus
+
+bool starts_with(const std::string& s, const char* prefix) { return s.rfind(prefix, 0) == 0; }
+
+// Scans found by calling the marker reader until it reports the end.
+int32_t count_scans(MarkerReader* r) {
+  int32_t scans = 0;
+  while (scans < 1000 && r->next() == 200) ++scans;
+  return scans;
+}
+
+std::string fixture_test_name(const std::string& file) {
+  std::string n = file.substr(0, file.rfind('.'));
+  for (char& c : n)
+    if (!std::isalnum(static_cast<unsigned char>(c))) c = '_';
+  return n;
+}
+
+class CorpusMarkers : public ::testing::TestWithParam<std::string> {};
+
+TEST_P(CorpusMarkers, FrameTablesAndScansAgreeWithTheOracle) {
+  const std::string name = GetParam();
+  const Bytes bytes = vjtest::read_fixture(name);
+  const vjtest::ManifestEntry* entry = vjtest::manifest_entry(name);
+  ASSERT_NE(entry, nullptr);
+  for (int32_t kind : {1, 4}) {
+    SCOPED_TRACE(kind == 1 ? "memory" : "caller stream");
+    MarkerReader r(bytes, kind);
+    const int32_t status = r.next();
+    if (starts_with(name, "bad_")) {
+      // 12-bit, extended-sequential and arithmetic-coded frames are refused.
+      EXPECT_EQ(status, 201);
+      continue;
+    }
+    ASSERT_EQ(status, 200);
+    const DecoderInfo* d = r.d();
+    const MarkerState* m = r.m();
+#if VETAJ_HAVE_LIBJPEG
+    vjtest::OracleHeader o;
+    ASSERT_TRUE(vjtest::oracle_header(bytes, &o));
+    EXPECT_EQ(d->image_width, o.width);
+    EXPECT_EQ(d->image_height, o.height);
+    EXPECT_EQ(d->num_components, o.num_components);
+    EXPECT_EQ(d->max_h_samp, o.max_h);
+    EXPECT_EQ(d->max_v_samp, o.max_v);
+    EXPECT_EQ(d->restart_interval, static_cast<uint32_t>(o.restart_interval));
+    EXPECT_EQ(m->frame_kind, o.progressive ? 2 : 1);
+    EXPECT_EQ(m->seen_adobe, o.saw_adobe);
+    if (o.saw_adobe) {
+      EXPECT_EQ(m->adobe_transform, o.adobe_transform);
+    }
+    if (o.saw_jfif) {
+      EXPECT_EQ(m->seen_app0, 1);
+    }
+    for (int i = 0; i < o.num_components && i < 4; ++i) {
+      EXPECT_EQ(d->components[i].id, o.comp_id[i]);
+      EXPECT_EQ(m->component_ids[i], o.comp_id[i]);
+      EXPECT_EQ(d->components[i].h_samp, o.h_samp[i]);
+      EXPECT_EQ(d->components[i].v_samp, o.v_samp[i]);
+    }
+    std::vector<vjtest::OracleComponent> comps;
+    ASSERT_TRUE(vjtest::oracle_coefficients(bytes, &comps));
+    for (size_t i = 0; i < comps.size() && i < d->num_components; ++i) {
+      const QuantTable* q = d->quant_tables[d->components[i].quant_no & 3];
+      ASSERT_NE(q, nullptr);
+      EXPECT_EQ(0, std::memcmp(q->values, comps[i].quant, sizeof q->values)) << "component " << i;
+    }
+#endif
+    EXPECT_EQ(1 + count_scans(&r), entry->marker_count("SOS"));
+    EXPECT_EQ(static_cast<int>(d->huff_store_count), entry->marker_count("DHT"));
+    if (kind == 4 && m->frame_kind == 2) {
+      // Read whole into memory at the progressive frame.
+      ASSERT_EQ(r.stream()->kind, 5);
+      ASSERT_EQ(r.stream()->size, bytes.size());
+      EXPECT_EQ(0, std::memcmp(r.stream()->source, bytes.data(), bytes.size()));
+    }
+  }
+}
+
+// Thumbnails the pre-scan must find in the corpus: format, size, length,
+// and the size of the picture a JPEG thumbnail holds.
+struct ExpectedThumb {
+  int32_t format, width, height;
+  uint32_t length;
+  int jpeg_width, jpeg_height;
+};
+
+const std::map<std::string, ExpectedThumb>& expected_thumbnails() {
+  static const std::map<std::string, ExpectedThumb> m{
+      {"exif_thumb_ii_640x480.jpg", {6, -1, -1, 0, 160, 120}},
+      {"exif_thumb_mm_320x240.jpg", {6, -1, -1, 0, 80, 60}},
+      {"exif_thumb_portrait_ii_240x320.jpg", {6, -1, -1, 0, 80, 60}},
+      {"thumb_jfif_rgb4x3_64x48.jpg", {1, 4, 3, 36, 0, 0}},
+      {"thumb_jfxx_jpeg_128x96.jpg", {6, -1, -1, 0, 32, 24}},
+      {"thumb_jfxx_rgb_128x96.jpg", {1, 16, 12, 576, 0, 0}},
+      {"thumb_jfxx_pal_128x96.jpg", {1, 16, 12, 768 + 192, 0, 0}},
+      {"thumb_app13_jpeg_640x480.jpg", {7, 160, 120, 5781, 160, 120}},
+  };
+  return m;
+}
+
+TEST_P(CorpusMarkers, PreScanFindsTheSizeAndThumbnail) {
+  const std::string name = GetParam();
+  const Bytes bytes = vjtest::read_fixture(name);
+  FileHeaderInfo h{};
+  const int32_t status = prescan(bytes, &h);
+  if (starts_with(name, "bad_")) {
+    // No 8-bit baseline or progressive frame: no picture to size.
+    EXPECT_EQ(status, 201);
+    return;
+  }
+  ASSERT_EQ(status, 200);
+#if VETAJ_HAVE_LIBJPEG
+  vjtest::OracleHeader o;
+  ASSERT_TRUE(vjtest::oracle_header(bytes, &o));
+  EXPECT_EQ(h.width, o.width);
+  EXPECT_EQ(h.height, o.height);
+  EXPECT_EQ(h.progressive, o.progressive);
+#endif
+  const ThumbnailInfo& t = h.thumbnail;
+  auto it = expected_thumbnails().find(name);
+  if (it == expected_thumbnails().end()) {
+    EXPECT_EQ(t.present, 0);
+    return;
+  }
+  const ExpectedThumb& e = it->second;
+  ASSERT_EQ(t.present, 1);
+  EXPECT_EQ(t.format, e.format);
+  if (e.width >= 0) {
+    EXPECT_EQ(t.width, e.width);
+    EXPECT_EQ(t.height, e.height);
+  }
+  if (e.length != 0) {
+    EXPECT_EQ(t.length, e.length);
+  }
+  ASSERT_LE(uint64_t(t.offset) + t.length, bytes.size());
+  if (e.jpeg_width != 0) {
+    const Bytes thumb(bytes.begin() + t.offset, bytes.begin() + t.offset + t.length);
+    ASSERT_GE(thumb.size(), 2u);
+    EXPECT_EQ(thumb[0], 0xFF);
+    EXPECT_EQ(thumb[1], 0xD8);
+#if VETAJ_HAVE_LIBJPEG
+    vjtest::OracleHeader th;
+    ASSERT_TRUE(vjtest::oracle_header(thumb, &th));
+    EXPECT_EQ(th.width, e.jpeg_width);
+    EXPECT_EQ(th.height, e.jpeg_height);
+#endif
+  }
+}
+
+INSTANTIATE_TEST_SUITE_P(Fixtures, CorpusMarkers, ::testing::ValuesIn(vjtest::list_fixtures(".jpg")),
+                         [](const auto& p) { return fixture_test_name(p.param); });
+
+// Truncated copies of every fixture: the marker reader and the pre-scan
+// never read outside the input, and what they report is the whole file's.
+TEST(CorpusTruncation, MarkerReaderAndPreScanFailCleanly) {
+  for (const std::string& name : vjtest::list_fixtures(".jpg")) {
+    const Bytes full = vjtest::read_fixture(name);
+    MarkerReader whole(full);
+    const int32_t full_scans = whole.next() == 200 ? 1 + count_scans(&whole) : 0;
+    FileHeaderInfo expected{};
+    prescan(full, &expected);
+    size_t i = 0;
+    for (size_t n : vjtest::cut_lengths(full.size(), 300, 30)) {
+      const Bytes cut(full.begin(), full.begin() + static_cast<long>(n));
+      MarkerReader r(cut, (i++ % 4 == 0) ? 4 : 1);
+      int32_t scans = 0;
+      if (r.next() == 200) scans = 1 + count_scans(&r);
+      EXPECT_LE(scans, full_scans) << name << " at " << n;
+      FileHeaderInfo h{};
+      if (prescan(cut, &h) == 200) {
+        EXPECT_EQ(h.width, expected.width) << name << " at " << n;
+        EXPECT_EQ(h.height, expected.height) << name << " at " << n;
+        EXPECT_EQ(h.progressive, expected.progressive) << name << " at " << n;
+        EXPECT_EQ(h.thumbnail.present, expected.thumbnail.present) << name << " at " << n;
+      }
+    }
   }
 }
 

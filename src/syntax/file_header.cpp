@@ -272,6 +272,7 @@ bool read_thumbnail_segment(StreamWindow* w, uint32_t code, ThumbnailInfo* work,
 int32_t VETAJ_ParseFileHeader(StreamWindow* w, int32_t mode, FileHeaderInfo* header) {
   if (w == nullptr || header == nullptr) return kStatusFail;
   ThumbnailInfo work = header->thumbnail;
+  bool have_frame = false;
   return vj::walk_markers(w, mode, [&](uint32_t code) {
     switch (code) {
       case vj::kMarkerSof2:
@@ -279,10 +280,12 @@ int32_t VETAJ_ParseFileHeader(StreamWindow* w, int32_t mode, FileHeaderInfo* hea
         [[fallthrough]];
       case vj::kMarkerSof0:
         // A repeated frame header is read again.
+        have_frame = true;
         return vj::read_frame_size_into(w, &header->width, &header->height) ? vj::Step::kNext
                                                                             : vj::Step::kFail;
       case vj::kMarkerSos:
-        return vj::Step::kDone;
+        // Without a baseline or progressive frame there is no picture to size.
+        return have_frame ? vj::Step::kDone : vj::Step::kFail;
       case vj::kMarkerApp0:
       case vj::kMarkerApp1:
       case vj::kMarkerApp13:

@@ -115,7 +115,8 @@ uint8_t VETAJ_ParseNextMarker(DecoderInfo* decoder, int32_t* status);
 // Pre-scan of a stream from the window's position (at or before SOI):
 // picture size, progressive flag and any thumbnail (JFIF, JFXX, Exif IFD1,
 // image resource 0x040C) whose data lies inside the input. `mode` must be 8
-// or 2. Returns 200 when an SOS is reached, 201 otherwise.
+// or 2. Returns 200 when an SOS is reached after an SOF0 or SOF2 frame
+// header, 201 otherwise.
 int32_t VETAJ_ParseFileHeader(StreamWindow* window, int32_t mode, FileHeaderInfo* header);
 
 #endif  // VETAJ_SYNTAX_MARKERS_H
