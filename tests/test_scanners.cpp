@@ -1,7 +1,6 @@
 // The quick stream scanners and the JPEG header summary call.
 #include <gtest/gtest.h>
 
-#include <cctype>
 #include <cstring>
 #include <string>
 #include <vector>
@@ -290,8 +289,6 @@ TEST(Scanners, TruncatedCopiesNeverCrash) {
 // ---------------------------------------------------------------------------
 // The fixture corpus
 
-bool starts_with(const std::string& s, const char* prefix) { return s.rfind(prefix, 0) == 0; }
-
 // The summary words a caller sees, in one comparable record.
 std::vector<int32_t> words(const JpegInfo& info) {
   std::vector<int32_t> w(13);
@@ -310,7 +307,7 @@ TEST_P(CorpusSummary, AgreesWithTheOracleOnEveryInputKind) {
   const int32_t ok = KOLVAVETA_JpgParser(memory.object(), &reference);
   // 12-bit and arithmetic-coded frames have no summary; an extended
   // sequential frame is read like a baseline one.
-  const bool refused = starts_with(name, "bad_") && name.find("sof1") == std::string::npos;
+  const bool refused = vjtest::has_kind(name, "bad_") && name.find("sof1") == std::string::npos;
   ASSERT_EQ(ok, refused ? 0 : 1);
   if (refused) {
     EXPECT_EQ(gKOLVAVETA_Error, 5);
@@ -356,12 +353,7 @@ TEST_P(CorpusSummary, EndOffsetIsWhereTheJpegDataEnds) {
 
 INSTANTIATE_TEST_SUITE_P(Fixtures, CorpusSummary,
                          ::testing::ValuesIn(vjtest::list_fixtures(".jpg")),
-                         [](const auto& p) {
-                           std::string n = p.param.substr(0, p.param.size() - 4);
-                           for (char& c : n)
-                             if (!std::isalnum(static_cast<unsigned char>(c))) c = '_';
-                           return n;
-                         });
+                         [](const auto& p) { return vjtest::fixture_test_name(p.param); });
 
 TEST(CorpusContainers, JpegInsideTiffIsReadAtItsOffset) {
   const auto names = vjtest::list_fixtures(".tif");

@@ -1,7 +1,6 @@
 // The decoder's marker reader and the file-header pre-scan.
 #include <gtest/gtest.h>
 
-#include <cctype>
 #include <cstring>
 #include <map>
 #include <functional>
@@ -814,20 +813,11 @@ TEST(ParseFileHeader, TruncatedStreamsFailCleanly) {
 // ---------------------------------------------------------------------------
 // The fixture corpus
 
-bool starts_with(const std::string& s, const char* prefix) { return s.rfind(prefix, 0) == 0; }
-
 // Scans found by calling the marker reader until it reports the end.
 int32_t count_scans(MarkerReader* r) {
   int32_t scans = 0;
   while (scans < 1000 && r->next() == 200) ++scans;
   return scans;
-}
-
-std::string fixture_test_name(const std::string& file) {
-  std::string n = file.substr(0, file.rfind('.'));
-  for (char& c : n)
-    if (!std::isalnum(static_cast<unsigned char>(c))) c = '_';
-  return n;
 }
 
 class CorpusMarkers : public ::testing::TestWithParam<std::string> {};
@@ -841,7 +831,7 @@ TEST_P(CorpusMarkers, FrameTablesAndScansAgreeWithTheOracle) {
     SCOPED_TRACE(kind == 1 ? "memory" : "caller stream");
     MarkerReader r(bytes, kind);
     const int32_t status = r.next();
-    if (starts_with(name, "bad_")) {
+    if (vjtest::has_kind(name, "bad_")) {
       // 12-bit, extended-sequential and arithmetic-coded frames are refused.
       EXPECT_EQ(status, 201);
       continue;
@@ -918,7 +908,7 @@ TEST_P(CorpusMarkers, PreScanFindsTheSizeAndThumbnail) {
   const Bytes bytes = vjtest::read_fixture(name);
   FileHeaderInfo h{};
   const int32_t status = prescan(bytes, &h);
-  if (starts_with(name, "bad_")) {
+  if (vjtest::has_kind(name, "bad_")) {
     // No 8-bit baseline or progressive frame: no picture to size.
     EXPECT_EQ(status, 201);
     return;
@@ -963,7 +953,7 @@ TEST_P(CorpusMarkers, PreScanFindsTheSizeAndThumbnail) {
 }
 
 INSTANTIATE_TEST_SUITE_P(Fixtures, CorpusMarkers, ::testing::ValuesIn(vjtest::list_fixtures(".jpg")),
-                         [](const auto& p) { return fixture_test_name(p.param); });
+                         [](const auto& p) { return vjtest::fixture_test_name(p.param); });
 
 // Truncated copies of every fixture: the marker reader and the pre-scan
 // never read outside the input, and what they report is the whole file's.

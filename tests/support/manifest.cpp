@@ -1,5 +1,6 @@
 #include "support/manifest.h"
 
+#include <cctype>
 #include <cstdlib>
 #include <sstream>
 #include <vector>
@@ -26,6 +27,13 @@ int ManifestEntry::marker_count(const std::string& marker) const {
 long ManifestEntry::number(const std::string& key, long fallback) const {
   auto it = fields.find(key);
   return it == fields.end() ? fallback : std::strtol(it->second.c_str(), nullptr, 10);
+}
+
+std::string fixture_test_name(const std::string& file) {
+  std::string n = file.substr(0, file.rfind('.'));
+  for (char& c : n)
+    if (!std::isalnum(static_cast<unsigned char>(c))) c = '_';
+  return n;
 }
 
 const ManifestEntry* manifest_entry(const std::string& name) {

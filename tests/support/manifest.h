@@ -21,6 +21,15 @@ struct ManifestEntry {
 // The entry of a fixture, or null when it is not listed.
 const ManifestEntry* manifest_entry(const std::string& name);
 
+// True when a fixture's name begins with a kind prefix such as "bad_".
+inline bool has_kind(const std::string& name, const char* prefix) {
+  return name.rfind(prefix, 0) == 0;
+}
+
+// A fixture's name made fit for a test name: the extension dropped, every
+// character other than a letter or digit turned into '_'.
+std::string fixture_test_name(const std::string& file);
+
 }  // namespace vjtest
 
 #endif  // VETAJ_TESTS_SUPPORT_MANIFEST_H
