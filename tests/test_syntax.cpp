@@ -698,6 +698,8 @@ TEST(ParseFileHeader, MalformedExifIsSkippedWithoutAThumbnail) {
   payloads.push_back(exif(false, {{0x201, 4, 30}, {0x202, 13, 40}}));  // bad type
   payloads.push_back(exif(false, good, 5000));                         // IFD0 past the segment
   payloads.push_back(exif(true, {{0x201, 4, 30}}));                    // no length
+  payloads.push_back(exif(true, {{0x202, 4, 30}}));                    // no offset
+  payloads.push_back(exif(true, {{0x201, 4, 30}, {0x202, 4, 0}}));     // length 0
   payloads.push_back(exif(true, {{0x201, 4, 0xFFFFFF00}, {0x202, 4, 40}}));  // past the input
   payloads.push_back(exif(false, {{0x201, 4, 30}, {0x202, 4, 0x7FFFFFFF}}));  // likewise
   Bytes order = exif(false, good);
@@ -771,6 +773,13 @@ TEST(ParseFileHeader, FindsAnImageResourceThumbnail) {
             200);
   EXPECT_EQ(raw.thumbnail.format, 1);
   EXPECT_EQ(raw.thumbnail.colour, 2);
+
+  // An Exif IFD1 without a location of its own leaves an earlier find alone.
+  FileHeaderInfo kept{};
+  ASSERT_EQ(prescan(with_app({{0xE0, jfif(1, 1, 1, 3)}, {0xE1, exif(false, {{0x100, 3, 9}})}}),
+                    &kept),
+            200);
+  expect_thumbnail(kept.thumbnail, {1, 1, 1, 2, 3, 2 + 4 + 14});
 
   // A thumbnail already found (JFIF) is kept: image resources are not read.
   FileHeaderInfo both{};

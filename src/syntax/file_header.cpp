@@ -118,6 +118,8 @@ bool exif_thumbnail(const uint8_t* p, uint32_t n, uint32_t at, ThumbnailInfo* t)
   if (next_at > tiff.size || !tiff.u32(static_cast<uint32_t>(next_at), &ifd1)) return false;
   if (ifd1 <= 1 || !tiff.u16(ifd1, &count)) return false;
 
+  // Location and length must come from this IFD, not from an earlier find.
+  bool have_offset = false, have_length = false;
   for (uint32_t i = 0; i < count; ++i) {
     const uint64_t entry64 = uint64_t(ifd1) + 2 + uint64_t(i) * kIfdEntry;
     if (entry64 + kIfdEntry > tiff.size) return false;
@@ -157,11 +159,13 @@ bool exif_thumbnail(const uint8_t* p, uint32_t n, uint32_t at, ThumbnailInfo* t)
         const uint64_t offset = uint64_t(value) + tiff_at;
         if (offset > UINT32_MAX) return false;
         t->offset = static_cast<uint32_t>(offset);
+        have_offset = true;
         break;
       }
       case kTagStripByteCounts:
         t->length = value;
         t->format = kThumbStrips;
+        have_length = true;
         break;
       case kTagPlanar:
         t->planar = static_cast<int32_t>(value);
@@ -169,6 +173,7 @@ bool exif_thumbnail(const uint8_t* p, uint32_t n, uint32_t at, ThumbnailInfo* t)
       case kTagJpegLength:
         t->length = value;
         t->format = kThumbJpeg;
+        have_length = true;
         break;
       case kTagVendor:
         t->vendor = static_cast<int32_t>(value);
@@ -177,7 +182,7 @@ bool exif_thumbnail(const uint8_t* p, uint32_t n, uint32_t at, ThumbnailInfo* t)
         break;
     }
   }
-  if (t->length == 0) return false;
+  if (!have_offset || !have_length || t->length == 0) return false;
   t->present = 1;
   return true;
 }
