@@ -26,9 +26,11 @@ using vjtest::JpegBuilder;
 // transform at 1.
 class MarkerReader {
  public:
-  explicit MarkerReader(const Bytes& bytes, int32_t kind = 1) : data_(bytes) {
-    const uint32_t size = static_cast<uint32_t>(data_.size());
-    if (size == 0) kind = 4;  // a memory input cannot be empty
+  // `size` overrides the input size a caller stream claims.
+  explicit MarkerReader(const Bytes& bytes, int32_t kind = 1, int64_t size_claimed = -1)
+      : data_(bytes) {
+    const uint32_t size = static_cast<uint32_t>(size_claimed < 0 ? data_.size() : size_claimed);
+    if (data_.empty()) kind = 4;  // a memory input cannot be empty
     if (kind == 4) {
       source_.data = data_;
       stream_ = KOLVAVETA_Open_Stream(&source_, vjtest::CallbackSource::read,
@@ -64,7 +66,6 @@ class MarkerReader {
   }
   DecoderInfo* d() const { return decoder_; }
   MarkerState* m() const { return decoder_->marker; }
-  StreamWindow* w() { return &window_; }
   IoStream* stream() const { return stream_; }
   // The next unread input byte.
   int32_t peek() { return vj::window_byte(&window_); }
@@ -80,17 +81,17 @@ class MarkerReader {
 const Bytes kCounts{0, 1, 1, 1, 1, 1, 1, 1, 1, 1, 1, 1, 0, 0, 0, 0};
 const Bytes kSymbols{0, 1, 2, 3, 4, 5, 6, 7, 8, 9, 10};
 
+// What the corpus cannot show: two tables in one DHT, the band of a baseline
+// scan, the window left at the entropy-coded data.
 TEST(ParseNextMarker, ReadsABaselineHeaderIntoTheDecoder) {
   Bytes two_tables = vjtest::dht_spec(0x00, kCounts, kSymbols);
   Bytes ac = vjtest::dht_spec(0x13, kCounts, kSymbols);
   two_tables.insert(two_tables.end(), ac.begin(), ac.end());
   JpegBuilder b;
   b.soi()
-      .dqt(0, 1)
       .dqt(3, 100)
-      .sof(0xC0, 300, 200, {{7, 2, 1, 0}, {8, 1, 2, 3}, {9, 1, 1, 3}})
+      .sof(0xC0, 300, 200, {{7, 2, 1, 3}, {8, 1, 2, 3}, {9, 1, 1, 3}})
       .segment(0xC4, two_tables)
-      .dri(12)
       .sos({{7, 0x03}, {8, 0x03}, {9, 0x03}}, 1, 5, 0x01)
       .raw({0xAB});
   MarkerReader r(b.bytes());
@@ -98,62 +99,19 @@ TEST(ParseNextMarker, ReadsABaselineHeaderIntoTheDecoder) {
   ASSERT_EQ(r.next(&code), 200);
   EXPECT_EQ(code, 0xDA);
   EXPECT_EQ(r.peek(), 0xAB) << "window left at the first entropy-coded byte";
-
-  DecoderInfo* d = r.d();
-  EXPECT_EQ(d->num_components, 3);
-  EXPECT_EQ(d->image_width, 300);
-  EXPECT_EQ(d->image_height, 200);
-  EXPECT_EQ(d->max_h_samp, 2);
-  EXPECT_EQ(d->max_v_samp, 2);
-  ASSERT_NE(d->components, nullptr);
-  const uint8_t ids[3] = {7, 8, 9}, hs[3] = {2, 1, 1}, vs[3] = {1, 2, 1}, tq[3] = {0, 3, 3};
-  for (int i = 0; i < 3; ++i) {
-    EXPECT_EQ(d->components[i].id, ids[i]);
-    EXPECT_EQ(d->components[i].index, i);
-    EXPECT_EQ(d->components[i].h_samp, hs[i]);
-    EXPECT_EQ(d->components[i].v_samp, vs[i]);
-    EXPECT_EQ(d->components[i].quant_no, tq[i]);
-    EXPECT_EQ(d->components[i].dc_no, 0);
-    EXPECT_EQ(d->components[i].ac_no, 3);
-    EXPECT_EQ(d->scan_components[i], &d->components[i]);
-    EXPECT_EQ(r.m()->component_ids[i], ids[i]);
-  }
-  EXPECT_EQ(d->scan_comp_index, 2u);
-  EXPECT_EQ(d->comps_in_scan, 3);
-  EXPECT_EQ(d->first_scan_comps, -1);
-
-  // Quantisation values land in natural order: zig-zag position 2 is (1,0).
-  ASSERT_NE(d->quant_tables[0], nullptr);
-  ASSERT_NE(d->quant_tables[3], nullptr);
-  EXPECT_EQ(d->quant_tables[1], nullptr);
-  EXPECT_EQ(d->quant_tables[0]->values[0], 1);
-  EXPECT_EQ(d->quant_tables[0]->values[1], 2);
-  EXPECT_EQ(d->quant_tables[0]->values[8], 3);
-  EXPECT_EQ(d->quant_tables[0]->values[63], 64);
-  EXPECT_EQ(d->quant_tables[3]->values[16], 103);
-
-  // Two specifications in one DHT fill two store slots and both pointers.
+  const DecoderInfo* d = r.d();
   EXPECT_EQ(d->huff_store_count, 2u);
   EXPECT_EQ(d->dc_huff[0], d->huff_store[0]);
   EXPECT_EQ(d->ac_huff[3], d->huff_store[1]);
   EXPECT_EQ(0, std::memcmp(d->huff_store[1]->bits + 1, kCounts.data(), 16));
   EXPECT_EQ(0, std::memcmp(d->huff_store[1]->huffval, kSymbols.data(), kSymbols.size()));
-
-  EXPECT_EQ(d->restart_interval, 12u);
-  // A baseline scan always covers the whole band at full precision.
-  EXPECT_EQ(d->Ss, 0u);
+  EXPECT_EQ(d->quant_tables[3]->values[8], 102) << "zig-zag position 2 is row 1, column 0";
+  for (int i = 0; i < 3; ++i) EXPECT_EQ(d->scan_components[i], &d->components[i]);
+  EXPECT_EQ(d->components[2].ac_no, 3);
+  EXPECT_EQ(d->scan_comp_index, 2u);
+  EXPECT_EQ(d->first_scan_comps, -1);
+  EXPECT_EQ(d->Ss + d->Ah + d->Al, 0u);
   EXPECT_EQ(d->Se, 63u);
-  EXPECT_EQ(d->Ah, 0u);
-  EXPECT_EQ(d->Al, 0u);
-
-  const MarkerState* m = r.m();
-  EXPECT_EQ(m->frame_kind, 1);
-  EXPECT_EQ(m->seen_sos, 1);
-  EXPECT_EQ(m->seen_dht, 1);
-  EXPECT_EQ(m->seen_dqt, 1);
-  EXPECT_EQ(m->seen_app0, 0);
-  EXPECT_EQ(m->seen_adobe, 0);
-  EXPECT_EQ(m->adobe_transform, 1);
 }
 
 TEST(ParseNextMarker, AcceptsFillBytesGarbageAndOtherCodesBetweenSegments) {
@@ -200,33 +158,6 @@ TEST(ParseNextMarker, ProgressiveScansKeepTheirBandAndFirstScanCount) {
   EXPECT_EQ(r.next(), 201);
 }
 
-TEST(ParseNextMarker, ReadsAdobeAndApp0Flags) {
-  Bytes adobe{'A', 'd', 'o', 'b', 'e', 0, 100, 0, 0, 0, 0, 2};
-  JpegBuilder b;
-  b.soi()
-      .segment(0xE0, {'J', 'F', 'I', 'F', 0})
-      .segment(0xEE, adobe)
-      .sof(0xC0, 8, 8, {{1, 1, 1, 0}})
-      .sos({{1, 0x00}});
-  MarkerReader r(b.bytes());
-  ASSERT_EQ(r.next(), 200);
-  EXPECT_EQ(r.m()->seen_app0, 1);
-  EXPECT_EQ(r.m()->seen_adobe, 1);
-  EXPECT_EQ(r.m()->adobe_transform, 2);
-
-  // An APP14 too short to hold the transform, or not "Adobe", is only skipped.
-  JpegBuilder c;
-  c.soi()
-      .segment(0xEE, {'A', 'd', 'o', 'b', 'e', 0, 100, 0, 0, 0, 0})
-      .segment(0xEE, {'B', 'd', 'o', 'b', 'e', 0, 100, 0, 0, 0, 0, 0})
-      .sof(0xC0, 8, 8, {{1, 1, 1, 0}})
-      .sos({{1, 0x00}});
-  MarkerReader r2(c.bytes());
-  ASSERT_EQ(r2.next(), 200);
-  EXPECT_EQ(r2.m()->seen_adobe, 0);
-  EXPECT_EQ(r2.m()->adobe_transform, 1);
-}
-
 TEST(ParseNextMarker, RedefinedTablesTakeNewSlotsUpToTheStoreSize) {
   auto stream_with = [](uint32_t specs) {
     JpegBuilder b;
@@ -251,9 +182,9 @@ struct BadHeader {
   Bytes bytes;
 };
 
-Bytes with_frame(const std::function<void(JpegBuilder&)>& middle, bool progressive = false) {
+Bytes with_frame(const std::function<void(JpegBuilder&)>& middle) {
   JpegBuilder b;
-  b.soi().sof(progressive ? 0xC2 : 0xC0, 16, 16, {{1, 1, 1, 0}, {2, 1, 1, 0}});
+  b.soi().sof(0xC0, 16, 16, {{1, 1, 1, 0}, {2, 1, 1, 0}});
   middle(b);
   b.sos({{1, 0x00}}).raw({0x00});
   return b.bytes();
@@ -268,13 +199,11 @@ Bytes raw_segment(uint8_t code, const Bytes& length_and_payload) {
 std::vector<BadHeader> bad_headers() {
   std::vector<BadHeader> v;
   auto add = [&](const char* name, const Bytes& bytes) { v.push_back({name, bytes}); };
-  auto sof = [](uint8_t code, uint32_t w, uint32_t h, const std::vector<vjtest::FrameComp>& c,
-                uint8_t precision = 8) {
+  auto sof = [](uint8_t code, uint32_t w, uint32_t h, const std::vector<vjtest::FrameComp>& c) {
     JpegBuilder b;
-    b.soi().sof(code, w, h, c, precision).sos({{1, 0x00}}).raw({0});
+    b.soi().sof(code, w, h, c).sos({{1, 0x00}}).raw({0});
     return b.bytes();
   };
-  add("Precision12", sof(0xC0, 8, 8, {{1, 1, 1, 0}}, 12));
   add("Width50001", sof(0xC0, 50001, 8, {{1, 1, 1, 0}}));
   add("Height50001", sof(0xC2, 8, 50001, {{1, 1, 1, 0}}));
   add("FiveComponents", sof(0xC0, 8, 8, {{1, 1, 1, 0}, {2, 1, 1, 0}, {3, 1, 1, 0},
@@ -282,8 +211,6 @@ std::vector<BadHeader> bad_headers() {
   add("NoComponents", sof(0xC0, 8, 8, {}));
   add("SamplingZero", sof(0xC0, 8, 8, {{1, 0, 1, 0}}));
   add("SamplingFive", sof(0xC0, 8, 8, {{1, 1, 5, 0}}));
-  add("ExtendedFrameIsNoFrame", sof(0xC1, 8, 8, {{1, 1, 1, 0}}));
-  add("ArithmeticFrameIsNoFrame", sof(0xC9, 8, 8, {{1, 1, 1, 0}}));
   {
     // Nf 3 with Lf 18: the length must be 3 * 3 + 8 = 17.
     JpegBuilder b;
@@ -293,8 +220,6 @@ std::vector<BadHeader> bad_headers() {
     add("FrameLengthMismatch", b.bytes());
   }
   add("SecondFrame", with_frame([](JpegBuilder& b) { b.sof(0xC0, 8, 8, {{1, 1, 1, 0}}); }));
-  add("SecondFrameProgressive",
-      with_frame([](JpegBuilder& b) { b.sof(0xC2, 8, 8, {{1, 1, 1, 0}}); }));
   {
     JpegBuilder b;
     b.soi().dqt(0).sos({{1, 0x00}}).sof(0xC0, 8, 8, {{1, 1, 1, 0}});
@@ -317,10 +242,8 @@ std::vector<BadHeader> bad_headers() {
         b.dht(0x00, kCounts, Bytes(kSymbols.begin(), kSymbols.end() - 1));
       }));
   add("DhtHeadCut", with_frame([](JpegBuilder& b) { b.segment(0xC4, Bytes(10, 0)); }));
-  add("DhtLengthZero", with_frame([](JpegBuilder& b) { b.raw(raw_segment(0xC4, {0, 0})); }));
   add("DriLengthFive", with_frame([](JpegBuilder& b) { b.segment(0xDD, {0, 1, 0}); }));
   add("AppLengthOne", with_frame([](JpegBuilder& b) { b.raw(raw_segment(0xE1, {0, 1})); }));
-  add("ComLengthZero", with_frame([](JpegBuilder& b) { b.raw(raw_segment(0xFE, {0, 0})); }));
   {
     JpegBuilder b;
     b.soi().sof(0xC0, 8, 8, {{1, 1, 1, 0}}).raw(raw_segment(0xE1, {0xFF, 0xF0, 1, 2, 3}));
@@ -370,38 +293,11 @@ TEST_P(ParseNextMarkerRefuses, WithStatus201AndNoScanReported) {
 INSTANTIATE_TEST_SUITE_P(BadHeaders, ParseNextMarkerRefuses, ::testing::ValuesIn(bad_headers()),
                          [](const auto& p) { return std::string(p.param.name); });
 
-// Every prefix of a complete header, read through a memory block and through
-// a caller stream, fails cleanly except the complete ones.
-TEST(ParseNextMarker, TruncatedHeadersFailCleanly) {
+// A caller stream is read whole into memory at a progressive frame, the part
+// before the window included (the source can rewind).
+TEST(ParseNextMarker, TurnsACallerStreamIntoAMemoryStream) {
   JpegBuilder b;
-  b.soi()
-      .segment(0xE0, {'J', 'F', 'I', 'F', 0, 1, 2, 0, 0, 1, 0, 1, 0, 0})
-      .dqt(0)
-      .dqt(1)
-      .sof(0xC0, 33, 17, {{1, 2, 2, 0}, {2, 1, 1, 1}, {3, 1, 1, 1}, {4, 1, 1, 1}})
-      .dht(0x00, kCounts, kSymbols)
-      .dht(0x10, kCounts, kSymbols)
-      .dri(3)
-      .sos({{1, 0x00}, {2, 0x00}, {3, 0x00}, {4, 0x00}});
-  const Bytes full = b.bytes();
-  for (int32_t kind : {1, 4}) {
-    for (size_t n = 0; n < full.size(); ++n) {
-      MarkerReader r(Bytes(full.begin(), full.begin() + static_cast<long>(n)), kind);
-      EXPECT_EQ(r.next(), 201) << "prefix " << n << " kind " << kind;
-    }
-    MarkerReader r(full, kind);
-    EXPECT_EQ(r.next(), 200);
-  }
-}
-
-// A caller stream is read whole into memory at a progressive frame.
-class StreamConversion : public ::testing::TestWithParam<bool> {};
-
-TEST_P(StreamConversion, TurnsACallerStreamIntoAMemoryStream) {
-  const bool large = GetParam();
-  JpegBuilder b;
-  b.soi();
-  if (large) b.com(30000, 0x11).com(20000, 0x22);
+  b.soi().com(30000, 0x11).com(20000, 0x22);
   b.sof(0xC2, 8, 8, {{1, 1, 1, 0}}).sos({{1, 0x00}}, 0, 0, 0).raw({0x5A});
   b.com(40, 0x33).sos({{1, 0x00}}, 1, 63, 0).raw({0xA5});
   const Bytes bytes = b.bytes();
@@ -409,57 +305,19 @@ TEST_P(StreamConversion, TurnsACallerStreamIntoAMemoryStream) {
   ASSERT_EQ(r.next(), 200);
   IoStream* s = r.stream();
   ASSERT_EQ(s->kind, 5);
-  EXPECT_EQ(s->size, bytes.size());
+  ASSERT_EQ(s->size, bytes.size());
   EXPECT_EQ(s->read_callback, nullptr);
-  EXPECT_EQ(s->skip_callback, nullptr);
-  const auto* block = static_cast<const uint8_t*>(s->source);
-  // The whole input, the part before the window included (the source can
-  // rewind), is in the block.
-  EXPECT_EQ(0, std::memcmp(block, bytes.data(), bytes.size()));
-  // The window reads on seamlessly from the block.
+  EXPECT_EQ(0, std::memcmp(s->source, bytes.data(), bytes.size()));
   EXPECT_EQ(r.peek(), 0x5A);
   ASSERT_EQ(r.next(), 200);
-  EXPECT_EQ(r.d()->Ss, 1u);
   EXPECT_EQ(r.peek(), 0xA5);
-  // And absolute seeks work now.
-  EXPECT_EQ(KOLVAVETA_Seek_IO(s, 2, 0), 2);
-}
 
-INSTANTIATE_TEST_SUITE_P(Sizes, StreamConversion, ::testing::Bool(),
-                         [](const auto& p) { return p.param ? "Large" : "Small"; });
-
-TEST(ParseNextMarker, StreamConversionRefusesAnUnknownOrTooSmallSize) {
-  JpegBuilder b;
-  b.soi().sof(0xC2, 8, 8, {{1, 1, 1, 0}}).sos({{1, 0x00}}, 0, 0, 0).raw({0x5A});
-  for (uint32_t size : {0u, 5u}) {
-    vjtest::CallbackSource source;
-    source.data = b.bytes();
-    IoStream* s = KOLVAVETA_Open_Stream(&source, vjtest::CallbackSource::read,
-                                        vjtest::CallbackSource::skip,
-                                        vjtest::CallbackSource::rewind, size);
-    StreamWindow w;
-    ASSERT_TRUE(vj::window_open(&w, s));
-    DecoderInfo* d = vj::alloc_zeroed<DecoderInfo>();
-    d->window = &w;
-    d->stream = s;
-    d->marker = vj::fake_alloc_zeroed<MarkerState>();
-    int32_t status = 0;
-    VETAJ_ParseNextMarker(d, &status);
-    EXPECT_EQ(status, 201) << "size " << size;
-    EXPECT_EQ(s->kind, 4);
-    VETAJ_DeleteDecoderInfo(d);
-    KOLVAVETA_OsFree(d);
-    vj::window_close(&w);
-    KOLVAVETA_Close_IO(s);
+  // An unknown size, or one below what was already read, is refused.
+  for (int64_t size : {0, 5}) {
+    MarkerReader bad(bytes, 4, size);
+    EXPECT_EQ(bad.next(), 201);
+    EXPECT_EQ(bad.stream()->kind, 4);
   }
-}
-
-TEST(ParseNextMarker, RefusesADecoderWithoutWindowOrMarkerState) {
-  DecoderInfo* d = vj::alloc_zeroed<DecoderInfo>();
-  int32_t status = 0;
-  EXPECT_EQ(VETAJ_ParseNextMarker(d, &status), 0);
-  EXPECT_EQ(status, 201);
-  KOLVAVETA_OsFree(d);
 }
 
 // ---------------------------------------------------------------------------
@@ -507,25 +365,6 @@ Bytes jfif(uint8_t major, uint8_t tw, uint8_t th, size_t pixel_bytes) {
   return p;
 }
 
-TEST(ParseFileHeader, ReportsSizeProgressiveFlagAndStopsAtTheScan) {
-  FileHeaderInfo h{};
-  h.thumbnail.unused9 = 77;
-  h.thumbnail.x_resolution[1] = 5;
-  EXPECT_EQ(prescan(with_app({}), &h), 200);
-  EXPECT_EQ(h.width, 640);
-  EXPECT_EQ(h.height, 480);
-  EXPECT_EQ(h.progressive, 0);
-  EXPECT_EQ(h.thumbnail.present, 0);
-  EXPECT_EQ(h.thumbnail.unused9, 77) << "words 9..14 pass through";
-  EXPECT_EQ(h.thumbnail.x_resolution[1], 5u);
-
-  FileHeaderInfo p{};
-  EXPECT_EQ(prescan(vjtest::small_progressive(17, 33), &p), 200);
-  EXPECT_EQ(p.width, 17);
-  EXPECT_EQ(p.height, 33);
-  EXPECT_EQ(p.progressive, 1);
-}
-
 TEST(ParseFileHeader, RefusesBadModesMissingSoiAndMalformedSegments) {
   FileHeaderInfo h{};
   EXPECT_EQ(prescan(with_app({}), &h, 3), 201);
@@ -551,61 +390,22 @@ TEST(ParseFileHeader, RefusesBadModesMissingSoiAndMalformedSegments) {
   EXPECT_EQ(prescan(f.bytes(), &h), 201) << "no baseline or progressive frame";
 }
 
-TEST(ParseFileHeader, FindsAJfifThumbnail) {
-  const Bytes stream = with_app({{0xE0, jfif(1, 2, 2, 12)}});
+// Other JFIF versions keep the thumbnail size one byte earlier; the caller's
+// words 9..14 pass through.
+TEST(ParseFileHeader, ReadsJfifThumbnailsOfOtherVersions) {
   FileHeaderInfo h{};
-  ASSERT_EQ(prescan(stream, &h), 200);
-  // SOI, marker and length, JFIF header.
-  expect_thumbnail(h.thumbnail, {2, 2, 1, 2, 12, 2 + 4 + 14});
-  EXPECT_EQ(stream[h.thumbnail.offset], 0x80);
-
-  FileHeaderInfo v2{};
-  ASSERT_EQ(prescan(with_app({{0xE0, jfif(2, 3, 1, 9)}}), &v2), 200);
-  expect_thumbnail(v2.thumbnail, {3, 1, 1, 2, 9, 2 + 4 + 14});
-
-  for (const Bytes& payload : {jfif(1, 2, 2, 11), jfif(1, 0, 2, 0), jfif(1, 2, 2, 13)}) {
-    FileHeaderInfo n{};
-    ASSERT_EQ(prescan(with_app({{0xE0, payload}}), &n), 200);
-    EXPECT_EQ(n.thumbnail.present, 0);
-  }
+  h.thumbnail.unused9 = 77;
+  h.thumbnail.x_resolution[1] = 5;
+  ASSERT_EQ(prescan(with_app({{0xE0, jfif(2, 3, 1, 9)}}), &h), 200);
+  expect_thumbnail(h.thumbnail, {3, 1, 1, 2, 9, 2 + 4 + 14});
+  EXPECT_EQ(h.thumbnail.unused9, 77);
+  EXPECT_EQ(h.thumbnail.x_resolution[1], 5u);
 }
 
 Bytes jfxx(uint8_t code, const Bytes& data) {
   Bytes p{'J', 'F', 'X', 'X', 0, code};
   p.insert(p.end(), data.begin(), data.end());
   return p;
-}
-
-TEST(ParseFileHeader, FindsJfxxThumbnails) {
-  {
-    const Bytes embedded{0xFF, 0xD8, 0xFF, 0xD9};
-    const Bytes stream = with_app({{0xE0, jfxx(0x10, embedded)}});
-    FileHeaderInfo h{};
-    ASSERT_EQ(prescan(stream, &h), 200);
-    expect_thumbnail(h.thumbnail, {0, 0, 6, 0, 4, 2 + 4 + 6});
-  }
-  {
-    Bytes rgb{3, 2};
-    rgb.resize(2 + 18, 0x40);
-    const Bytes stream = with_app({{0xE0, jfxx(0x13, rgb)}});
-    FileHeaderInfo h{};
-    ASSERT_EQ(prescan(stream, &h), 200);
-    expect_thumbnail(h.thumbnail, {3, 2, 1, 2, 18, 2 + 4 + 8});
-  }
-  {
-    Bytes palette{2, 2};
-    palette.resize(2 + 768 + 4, 0x01);
-    FileHeaderInfo h{};
-    ASSERT_EQ(prescan(with_app({{0xE0, jfxx(0x11, palette)}}), &h), 200);
-    expect_thumbnail(h.thumbnail, {2, 2, 1, 2, 768 + 4, 2 + 4 + 8});
-  }
-  // Sizes that do not match the data, and unknown extension codes, are no thumbnail.
-  for (const Bytes& payload : {jfxx(0x13, {3, 2, 1, 2, 3}), jfxx(0x11, {1, 1, 0}),
-                               jfxx(0x13, {0, 2}), jfxx(0x12, {1, 1, 0, 0, 0}), jfxx(0x10, {})}) {
-    FileHeaderInfo h{};
-    ASSERT_EQ(prescan(with_app({{0xE0, payload}}), &h), 200);
-    EXPECT_EQ(h.thumbnail.present, 0);
-  }
 }
 
 // An Exif APP1 payload: IFD0 with one entry, IFD1 with the given entries.
@@ -692,37 +492,6 @@ TEST(ParseFileHeader, UncompressedExifThumbnailUsesStrips) {
   expect_thumbnail(h.thumbnail, {0, 0, 0, 0, 48, 12 + 40});
 }
 
-TEST(ParseFileHeader, MalformedExifIsSkippedWithoutAThumbnail) {
-  const std::vector<IfdEntry> good{{0x201, 4, 30}, {0x202, 4, 40}};
-  std::vector<Bytes> payloads;
-  payloads.push_back(exif(false, {{0x201, 4, 30}, {0x202, 13, 40}}));  // bad type
-  payloads.push_back(exif(false, good, 5000));                         // IFD0 past the segment
-  payloads.push_back(exif(true, {{0x201, 4, 30}}));                    // no length
-  payloads.push_back(exif(true, {{0x202, 4, 30}}));                    // no offset
-  payloads.push_back(exif(true, {{0x201, 4, 30}, {0x202, 4, 0}}));     // length 0
-  payloads.push_back(exif(true, {{0x201, 4, 0xFFFFFF00}, {0x202, 4, 40}}));  // past the input
-  payloads.push_back(exif(false, {{0x201, 4, 30}, {0x202, 4, 0x7FFFFFFF}}));  // likewise
-  Bytes order = exif(false, good);
-  order[6] = 'X';
-  payloads.push_back(order);
-  Bytes magic = exif(false, good);
-  magic[8] = 43;
-  payloads.push_back(magic);
-  Bytes no_next = exif(false, good);
-  no_next[6 + 8 + 2 + 12] = 0;  // next-IFD offset 0
-  no_next[6 + 8 + 2 + 12 + 1] = 0;
-  payloads.push_back(no_next);
-  Bytes many = exif(false, good);
-  many[6 + 8 + 2 + 12 + 4] = 0xFF;  // IFD1 entry count running past the segment
-  payloads.push_back(many);
-  payloads.push_back(Bytes{'E', 'x', 'i', 'f', 0, 0, 'I', 'I'});
-  for (size_t i = 0; i < payloads.size(); ++i) {
-    FileHeaderInfo h{};
-    ASSERT_EQ(prescan(with_app({{0xE1, payloads[i]}}, 100), &h), 200) << i;
-    EXPECT_EQ(h.thumbnail.present, 0) << i;
-  }
-}
-
 Bytes resource(uint16_t id, const std::string& name, const Bytes& data) {
   Bytes r{'8', 'B', 'I', 'M'};
   vjtest::put16(&r, id);
@@ -756,68 +525,71 @@ Bytes thumb_resource(uint32_t format, uint32_t length, uint32_t data_bytes) {
   return d;
 }
 
-TEST(ParseFileHeader, FindsAnImageResourceThumbnail) {
-  const Bytes app13 = photoshop({resource(0x0409, "abc", Bytes(7, 1)),
-                                 resource(0x040C, "", thumb_resource(1, 50, 51))});
-  const Bytes stream = with_app({{0xED, app13}});
-  FileHeaderInfo h{};
-  ASSERT_EQ(prescan(stream, &h), 200);
-  // SOI, marker and length, signature, the first resource (4+2+4+4+8), the
-  // second's head (4+2+2+4), the 28-byte thumbnail header.
-  expect_thumbnail(h.thumbnail, {80, 60, 7, 0, 50, 2 + 4 + 14 + 22 + 12 + 28});
-  EXPECT_EQ(stream[h.thumbnail.offset], 0xCC);
-
-  FileHeaderInfo raw{};
-  ASSERT_EQ(prescan(with_app({{0xED, photoshop({resource(0x040C, "x", thumb_resource(0, 8, 8))})}}),
-                    &raw),
-            200);
-  EXPECT_EQ(raw.thumbnail.format, 1);
-  EXPECT_EQ(raw.thumbnail.colour, 2);
-
-  // An Exif IFD1 without a location of its own leaves an earlier find alone.
-  FileHeaderInfo kept{};
-  ASSERT_EQ(prescan(with_app({{0xE0, jfif(1, 1, 1, 3)}, {0xE1, exif(false, {{0x100, 3, 9}})}}),
-                    &kept),
-            200);
-  expect_thumbnail(kept.thumbnail, {1, 1, 1, 2, 3, 2 + 4 + 14});
-
-  // A thumbnail already found (JFIF) is kept: image resources are not read.
-  FileHeaderInfo both{};
-  ASSERT_EQ(prescan(with_app({{0xE0, jfif(1, 1, 1, 3)}, {0xED, app13}}), &both), 200);
-  EXPECT_EQ(both.thumbnail.format, 1);
-  EXPECT_EQ(both.thumbnail.length, 3u);
-
-  // Resources that run past the segment, or a thumbnail longer than its
-  // resource, give nothing.
-  for (const Bytes& bad : {photoshop({resource(0x040C, "", thumb_resource(1, 60, 51))}),
-                           photoshop({resource(0x040C, "", Bytes(20, 0))})}) {
-    FileHeaderInfo n{};
-    ASSERT_EQ(prescan(with_app({{0xED, bad}}), &n), 200);
-    EXPECT_EQ(n.thumbnail.present, 0);
-  }
-  Bytes cut = photoshop({resource(0x040C, "", thumb_resource(1, 50, 51))});
-  cut.resize(cut.size() - 40);
-  FileHeaderInfo n{};
-  ASSERT_EQ(prescan(with_app({{0xED, cut}}), &n), 200);
-  EXPECT_EQ(n.thumbnail.present, 0);
-}
-
-TEST(ParseFileHeader, TruncatedStreamsFailCleanly) {
-  const std::vector<IfdEntry> ifd1{{0x201, 4, 30}, {0x202, 4, 40}};
-  const Bytes full = with_app({{0xE0, jfif(1, 1, 1, 3)},
-                               {0xE1, exif(true, ifd1)},
-                               {0xED, photoshop({resource(0x040C, "", thumb_resource(1, 8, 8))})}},
-                              4);
-  size_t sos = 0;
-  for (size_t i = 0; i + 1 < full.size(); ++i)
-    if (full[i] == 0xFF && full[i + 1] == 0xDA) sos = i;
-  for (size_t n = 0; n < full.size(); ++n) {
+TEST(ParseFileHeader, KeepsAnEarlierThumbnail) {
+  const Bytes app13 = photoshop({resource(0x040C, "", thumb_resource(1, 50, 51))});
+  for (const auto& later : {std::pair<uint8_t, Bytes>{0xE1, exif(false, {{0x100, 3, 9}})},
+                            std::pair<uint8_t, Bytes>{0xED, app13}}) {
     FileHeaderInfo h{};
-    const Bytes cut(full.begin(), full.begin() + static_cast<long>(n));
-    const int32_t status = n == 0 ? 201 : prescan(cut, &h);
-    EXPECT_EQ(status, n >= sos + 2 ? 200 : 201) << "prefix " << n;
+    ASSERT_EQ(prescan(with_app({{0xE0, jfif(1, 1, 1, 3)}, later}), &h), 200);
+    expect_thumbnail(h.thumbnail, {1, 1, 1, 2, 3, 2 + 4 + 14});
   }
 }
+
+// APP segments that hold no usable thumbnail.
+struct NoThumb {
+  const char* name;
+  uint8_t code;
+  Bytes payload;
+};
+
+std::vector<NoThumb> no_thumbnails() {
+  const std::vector<IfdEntry> good{{0x201, 4, 30}, {0x202, 4, 40}};
+  auto patched = [](Bytes b, size_t at, uint8_t v) {
+    b[at] = v;
+    return b;
+  };
+  constexpr size_t kNext = 6 + 8 + 2 + 12;  // next-IFD offset of IFD0 in the payload
+  Bytes cut13 = photoshop({resource(0x040C, "", thumb_resource(1, 50, 51))});
+  cut13.resize(cut13.size() - 40);
+  return {
+      {"JfifPixelsShort", 0xE0, jfif(1, 2, 2, 11)},
+      {"JfifPixelsLong", 0xE0, jfif(1, 2, 2, 13)},
+      {"JfifZeroWidth", 0xE0, jfif(1, 0, 2, 0)},
+      {"JfxxRgbShort", 0xE0, jfxx(0x13, {3, 2, 1, 2, 3})},
+      {"JfxxPaletteShort", 0xE0, jfxx(0x11, {1, 1, 0})},
+      {"JfxxZeroWidth", 0xE0, jfxx(0x13, {0, 2})},
+      {"JfxxUnknownCode", 0xE0, jfxx(0x12, {1, 1, 0, 0, 0})},
+      {"JfxxEmptyJpeg", 0xE0, jfxx(0x10, {})},
+      {"ExifBadType", 0xE1, exif(false, {{0x201, 4, 30}, {0x202, 13, 40}})},
+      {"ExifIfd0PastSegment", 0xE1, exif(false, good, 5000)},
+      {"ExifNoLength", 0xE1, exif(true, {{0x201, 4, 30}})},
+      {"ExifNoOffset", 0xE1, exif(true, {{0x202, 4, 30}})},
+      {"ExifLengthZero", 0xE1, exif(true, {{0x201, 4, 30}, {0x202, 4, 0}})},
+      {"ExifOffsetPastInput", 0xE1, exif(true, {{0x201, 4, 0xFFFFFF00}, {0x202, 4, 40}})},
+      {"ExifLengthPastInput", 0xE1, exif(false, {{0x201, 4, 30}, {0x202, 4, 0x7FFFFFFF}})},
+      {"ExifByteOrder", 0xE1, patched(exif(false, good), 6, 'X')},
+      {"ExifMagic", 0xE1, patched(exif(false, good), 8, 43)},
+      {"ExifNoNextIfd", 0xE1, patched(patched(exif(false, good), kNext, 0), kNext + 1, 0)},
+      {"ExifEntriesPastSegment", 0xE1, patched(exif(false, good), kNext + 4, 0xFF)},
+      {"ExifTooShort", 0xE1, Bytes{'E', 'x', 'i', 'f', 0, 0, 'I', 'I'}},
+      {"ResourceThumbLongerThanResource", 0xED,
+       photoshop({resource(0x040C, "", thumb_resource(1, 60, 51))})},
+      {"ResourceShorterThanHeader", 0xED, photoshop({resource(0x040C, "", Bytes(20, 0))})},
+      {"ResourcePastSegment", 0xED, cut13},
+  };
+}
+
+class PreScanWithoutThumbnail : public ::testing::TestWithParam<NoThumb> {};
+
+TEST_P(PreScanWithoutThumbnail, SkipsTheSegment) {
+  FileHeaderInfo h{};
+  ASSERT_EQ(prescan(with_app({{GetParam().code, GetParam().payload}}, 100), &h), 200);
+  EXPECT_EQ(h.thumbnail.present, 0);
+  EXPECT_EQ(h.width, 640);
+}
+
+INSTANTIATE_TEST_SUITE_P(Segments, PreScanWithoutThumbnail, ::testing::ValuesIn(no_thumbnails()),
+                         [](const auto& p) { return std::string(p.param.name); });
 
 // ---------------------------------------------------------------------------
 // The fixture corpus
