@@ -84,8 +84,8 @@ const Bytes kSymbols{0, 1, 2, 3, 4, 5, 6, 7, 8, 9, 10};
 // What the corpus cannot show: two tables in one DHT, the band of a baseline
 // scan, the window left at the entropy-coded data.
 TEST(ParseNextMarker, ReadsABaselineHeaderIntoTheDecoder) {
-  Bytes two_tables = vjtest::dht_spec(0x00, kCounts, kSymbols);
-  Bytes ac = vjtest::dht_spec(0x13, kCounts, kSymbols);
+  Bytes two_tables = vjtest::dht_table(0x00, kCounts, kSymbols);
+  Bytes ac = vjtest::dht_table(0x13, kCounts, kSymbols);
   two_tables.insert(two_tables.end(), ac.begin(), ac.end());
   JpegBuilder b;
   b.soi()
@@ -159,10 +159,10 @@ TEST(ParseNextMarker, ProgressiveScansKeepTheirBandAndFirstScanCount) {
 }
 
 TEST(ParseNextMarker, RedefinedTablesTakeNewSlotsUpToTheStoreSize) {
-  auto stream_with = [](uint32_t specs) {
+  auto stream_with = [](uint32_t tables) {
     JpegBuilder b;
     b.soi().sof(0xC0, 8, 8, {{1, 1, 1, 0}});
-    for (uint32_t i = 0; i < specs; ++i) b.dht(0x00, kCounts, kSymbols);
+    for (uint32_t i = 0; i < tables; ++i) b.dht(0x00, kCounts, kSymbols);
     b.sos({{1, 0x00}});
     return b.bytes();
   };

@@ -12,10 +12,10 @@ namespace {
 using vj::kStatusFail;
 using vj::kStatusOk;
 
-// Size of one table specification: class/number byte and 16 code counts.
-constexpr uint32_t kHuffSpecHead = 17;
-// Size of one 8-bit quantisation table specification.
-constexpr uint32_t kQuantSpec = 65;
+// Head of one Huffman table definition: class/number byte and 16 code counts.
+constexpr uint32_t kHuffTableHead = 17;
+// Size of one 8-bit quantisation table definition.
+constexpr uint32_t kQuantTableBytes = 65;
 // Largest successive-approximation bit position of an 8-bit progressive scan.
 constexpr uint32_t kMaxApproxBit = 13;
 
@@ -106,22 +106,22 @@ bool read_frame(DecoderInfo* d, StreamWindow* w, uint8_t kind) {
   return true;
 }
 
-// DHT: each table specification takes the next slot of the table store.
+// DHT: each table definition takes the next slot of the table store.
 bool read_dht(DecoderInfo* d, StreamWindow* w) {
   d->marker->seen_dht = 1;
   uint32_t length = 0;
   if (!vj::read_be16(w, &length) || length < 2) return false;
   uint32_t left = length - 2;
   while (left > 0) {
-    if (left < kHuffSpecHead || d->huff_store_count >= kMaxTableSpecs) return false;
-    if (VETAJ_CheckBuffer(w, kHuffSpecHead) == 0) return false;
-    const uint8_t* p = vj::window_take(w, kHuffSpecHead);
+    if (left < kHuffTableHead || d->huff_store_count >= kMaxTableSpecs) return false;
+    if (VETAJ_CheckBuffer(w, kHuffTableHead) == 0) return false;
+    const uint8_t* p = vj::window_take(w, kHuffTableHead);
     const uint32_t table_class = p[0] >> 4;
     const uint32_t number = p[0] & 15u;
     if (table_class > 1 || number > 3) return false;
     uint32_t symbols = 0;
     for (uint32_t i = 1; i <= 16; ++i) symbols += p[i];
-    if (symbols > 256 || symbols > left - kHuffSpecHead) return false;
+    if (symbols > 256 || symbols > left - kHuffTableHead) return false;
 
     auto* table = vj::alloc_zeroed<HuffTable>();
     if (table == nullptr) return false;
@@ -129,7 +129,7 @@ bool read_dht(DecoderInfo* d, StreamWindow* w) {
     std::memcpy(table->bits + 1, p + 1, 16);
     if (!vj::read_bytes(w, table->huffval, symbols)) return false;
     (table_class == 0 ? d->dc_huff : d->ac_huff)[number] = table;
-    left -= kHuffSpecHead + symbols;
+    left -= kHuffTableHead + symbols;
   }
   return true;
 }
@@ -140,9 +140,9 @@ bool read_dqt(DecoderInfo* d, StreamWindow* w) {
   if (!vj::read_be16(w, &length) || length < 2) return false;
   uint32_t left = length - 2;
   while (left > 0) {
-    if (left < kQuantSpec) return false;
-    if (VETAJ_CheckBuffer(w, kQuantSpec) == 0) return false;
-    const uint8_t* p = vj::window_take(w, kQuantSpec);
+    if (left < kQuantTableBytes) return false;
+    if (VETAJ_CheckBuffer(w, kQuantTableBytes) == 0) return false;
+    const uint8_t* p = vj::window_take(w, kQuantTableBytes);
     const uint32_t precision = p[0] >> 4;
     const uint32_t number = p[0] & 15u;
     if (precision != 0 || number > 3) return false;
@@ -152,7 +152,7 @@ bool read_dqt(DecoderInfo* d, StreamWindow* w) {
       if (table == nullptr) return false;
     }
     for (uint32_t k = 0; k < 64; ++k) table->values[VETAJ_NATURAL_ORDER[k]] = p[1 + k];
-    left -= kQuantSpec;
+    left -= kQuantTableBytes;
   }
   d->marker->seen_dqt = 1;
   return true;

@@ -48,7 +48,7 @@ JpegBuilder& JpegBuilder::dqt(uint8_t number, uint8_t first) {
   return segment(0xDB, p);
 }
 
-Bytes dht_spec(uint8_t class_number, const Bytes& counts, const Bytes& symbols) {
+Bytes dht_table(uint8_t class_number, const Bytes& counts, const Bytes& symbols) {
   Bytes p{class_number};
   p.insert(p.end(), counts.begin(), counts.end());
   p.insert(p.end(), symbols.begin(), symbols.end());
@@ -56,7 +56,7 @@ Bytes dht_spec(uint8_t class_number, const Bytes& counts, const Bytes& symbols) 
 }
 
 JpegBuilder& JpegBuilder::dht(uint8_t class_number, const Bytes& counts, const Bytes& symbols) {
-  return segment(0xC4, dht_spec(class_number, counts, symbols));
+  return segment(0xC4, dht_table(class_number, counts, symbols));
 }
 
 JpegBuilder& JpegBuilder::dri(uint32_t interval) {
@@ -89,9 +89,9 @@ const Bytes kSymbols{0, 1, 2, 3, 4, 5, 6, 7, 8, 9, 10};
 
 JpegBuilder& tables(JpegBuilder& b) {
   b.dqt(0, 2).dqt(1, 3);
-  Bytes p = dht_spec(0x00, kCounts, kSymbols);
+  Bytes p = dht_table(0x00, kCounts, kSymbols);
   for (uint8_t cls : {0x10, 0x01, 0x11}) {
-    Bytes more = dht_spec(cls, kCounts, kSymbols);
+    Bytes more = dht_table(cls, kCounts, kSymbols);
     p.insert(p.end(), more.begin(), more.end());
   }
   return b.segment(0xC4, p);

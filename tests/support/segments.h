@@ -39,7 +39,7 @@ class JpegBuilder {
                    const std::vector<FrameComp>& comps, uint8_t precision = 8);
   // One 8-bit table whose k-th value in zig-zag order is first + k.
   JpegBuilder& dqt(uint8_t number, uint8_t first = 1);
-  // One table specification: class/number byte, counts[16], symbols.
+  // One table definition: class/number byte, counts[16], symbols.
   JpegBuilder& dht(uint8_t class_number, const Bytes& counts, const Bytes& symbols);
   JpegBuilder& dri(uint32_t interval);
   JpegBuilder& sos(const std::vector<ScanComp>& comps, uint8_t ss = 0, uint8_t se = 63,
@@ -52,8 +52,8 @@ class JpegBuilder {
   Bytes bytes_;
 };
 
-// DHT payload of one specification (for building multi-table segments).
-Bytes dht_spec(uint8_t class_number, const Bytes& counts, const Bytes& symbols);
+// DHT payload of one table (for building multi-table segments).
+Bytes dht_table(uint8_t class_number, const Bytes& counts, const Bytes& symbols);
 
 // A syntactically complete baseline stream: SOI, DQT, SOF0 (three components,
 // the first sampled h x v), DHT, optional DRI, SOS, a few entropy bytes, EOI.
