@@ -49,9 +49,11 @@ JpegBuilder& JpegBuilder::dqt(uint8_t number, uint8_t first) {
 }
 
 Bytes dht_table(uint8_t class_number, const Bytes& counts, const Bytes& symbols) {
-  Bytes p{class_number};
-  p.insert(p.end(), counts.begin(), counts.end());
-  p.insert(p.end(), symbols.begin(), symbols.end());
+  Bytes p;
+  p.reserve(1 + counts.size() + symbols.size());
+  p.push_back(class_number);
+  for (uint8_t c : counts) p.push_back(c);
+  for (uint8_t s : symbols) p.push_back(s);
   return p;
 }
 
