@@ -386,6 +386,12 @@ VETAJ_API int32_t VETAJ_GetDctMethodIndex(int32_t last_index);
 /* Constant tables. */
 VETAJ_API extern const uint8_t VETAJ_NATURAL_ORDER[80];
 VETAJ_API extern const int32_t VETAJ_HUFF_EXTEND_TEST[16];
+/* Inverse transform slot templates. Full size: slot min(k, 28) for a block
+ * whose last coefficient is at zig-zag position k; pIDctFunc holds routines
+ * specialised for blocks ending at k (k must be exact or larger),
+ * pIDctFuncIslow the full transform in every slot. pIDctResizeFunc: by
+ * scale index 0 (full, the uniform template), 1 (1/2), 2 (1/4), 3 (1/8);
+ * entries 1..3 have 7 slots, every slot holding the same routine. */
 VETAJ_API extern const VETAJ_IdctFn pIDctFunc[29];
 VETAJ_API extern const VETAJ_IdctFn pIDctFuncIslow[29];
 VETAJ_API extern const VETAJ_IdctFn* const pIDctResizeFunc[4];
@@ -480,7 +486,8 @@ VETAJ_API int32_t KOLVAVETA_SkiaDecodeJPEG(DecInfo* object, void* output_buffer,
  * use (it returns -1) and registers a name longer than
  * JPEG_STAT_NAME_SIZE - 1 characters truncated to that length (so a later
  * lookup of the same long name finds it again); argument texts longer than
- * JPEG_STAT_ARGUMENT_SIZE - 1 characters are truncated. */
+ * JPEG_STAT_ARGUMENT_SIZE - 1 characters are truncated. accumulate_stat_info
+ * adds times and call counts with saturation at the 32-bit limits. */
 #define JPEG_STAT_MAX_ENTRIES 1024
 #define JPEG_STAT_NAME_SIZE 128
 #define JPEG_STAT_ARGUMENT_SIZE 512

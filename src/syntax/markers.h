@@ -105,12 +105,18 @@ struct FileHeaderInfo {
 constexpr uint32_t kMaxTableSpecs = 120;
 
 // Reads marker segments from the decoder's window up to and including the
-// next SOS header. Sets *status to 200 or 201 and returns the last marker
-// code read (0xDA after a scan header).
+// next SOS header, filling the frame, table and scan fields. On success sets
+// *status to 200 and returns 0xDA with the window at the first byte of
+// entropy-coded data. On any failure (input ending included) sets *status to
+// 201 and returns the last marker code read, or 0 when the scan header itself
+// was faulty: 0xDA is returned only for a scan header that was read.
 uint8_t VETAJ_ParseNextMarker(DecoderInfo* decoder, int32_t* status);
 
-// Pre-scan of a stream: picture size, progressive flag and any thumbnail.
-// Returns 200 when an SOS is reached, 201 otherwise.
+// Pre-scan of a stream from the window's position (at or before SOI):
+// picture size, progressive flag and any thumbnail (JFIF, JFXX, Exif IFD1,
+// image resource 0x040C) whose data lies inside the input. `mode` must be 8
+// or 2. Returns 200 when an SOS is reached after an SOF0 or SOF2 frame
+// header, 201 otherwise.
 int32_t VETAJ_ParseFileHeader(StreamWindow* window, int32_t mode, FileHeaderInfo* header);
 
 #endif  // VETAJ_SYNTAX_MARKERS_H
