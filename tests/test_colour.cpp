@@ -52,27 +52,66 @@ Px ref_ycck(int y, int cb, int cr, int k) {
 
 int bytes_of(int format) {
   switch (format) {
-    case 0: case 9: case 10: return 2;
-    case 1: case 3: case 6: case 11: return 3;
-    case 5: case 7: case 8: case 12: return 4;
-    case 2: return 1;
-    default: return 0;
+    case 0:
+    case 9:
+    case 10:
+      return 2;
+    case 1:
+    case 3:
+    case 6:
+    case 11:
+      return 3;
+    case 5:
+    case 7:
+    case 8:
+    case 12:
+      return 4;
+    case 2:
+      return 1;
+    default:
+      return 0;
   }
 }
 void encode(int format, const std::array<int, 3>& c, uint8_t* p) {
   const int r = c[0], g = c[1], b = c[2];
   switch (format) {
-    case 0: case 9: case 10: {
+    case 0:
+    case 9:
+    case 10: {
       const int v = ((r >> 3) << 11) | ((g >> 2) << 5) | (b >> 3);
       p[0] = uint8_t(v & 255);
       p[1] = uint8_t(v >> 8);
       break;
     }
-    case 1: case 3: case 6: case 11: p[0] = uint8_t(r); p[1] = uint8_t(g); p[2] = uint8_t(b); break;
-    case 5: p[0] = 255; p[1] = uint8_t(r); p[2] = uint8_t(g); p[3] = uint8_t(b); break;
-    case 7: case 12: p[0] = uint8_t(r); p[1] = uint8_t(g); p[2] = uint8_t(b); p[3] = 255; break;
-    case 8: p[0] = uint8_t(b); p[1] = uint8_t(g); p[2] = uint8_t(r); p[3] = 255; break;
-    default: break;
+    case 1:
+    case 3:
+    case 6:
+    case 11:
+      p[0] = uint8_t(r);
+      p[1] = uint8_t(g);
+      p[2] = uint8_t(b);
+      break;
+    case 5:
+      p[0] = 255;
+      p[1] = uint8_t(r);
+      p[2] = uint8_t(g);
+      p[3] = uint8_t(b);
+      break;
+    case 7:
+    case 12:
+      p[0] = uint8_t(r);
+      p[1] = uint8_t(g);
+      p[2] = uint8_t(b);
+      p[3] = 255;
+      break;
+    case 8:
+      p[0] = uint8_t(b);
+      p[1] = uint8_t(g);
+      p[2] = uint8_t(r);
+      p[3] = 255;
+      break;
+    default:
+      break;
   }
 }
 
@@ -102,10 +141,14 @@ struct Canvas {
   // Buffer coordinates of output pixel x of output row y.
   std::pair<int, int> place(int x, int y) const {
     switch (rotation) {
-      case 4: return {ox + vh - 1 - y, oy + x};
-      case 8: return {ox + vw - 1 - x, oy + vh - 1 - y};
-      case 12: return {ox + y, oy + vw - 1 - x};
-      default: return {ox + x, oy + y};
+      case 4:
+        return {ox + vh - 1 - y, oy + x};
+      case 8:
+        return {ox + vw - 1 - x, oy + vh - 1 - y};
+      case 12:
+        return {ox + y, oy + vw - 1 - x};
+      default:
+        return {ox + x, oy + y};
     }
   }
   size_t offset(int x, int y) const { return (size_t(y) * bw + x) * bpp; }
@@ -156,6 +199,20 @@ struct Canvas {
     return e;
   }
 };
+
+// Compares two buffers, naming the first differing byte.
+::testing::AssertionResult same_bytes(const std::vector<uint8_t>& actual,
+                                      const std::vector<uint8_t>& expected) {
+  if (actual.size() != expected.size()) return ::testing::AssertionFailure() << "sizes differ";
+  size_t diffs = 0, first = 0;
+  for (size_t i = 0; i < actual.size(); ++i) {
+    if (actual[i] != expected[i] && diffs++ == 0) first = i;
+  }
+  if (diffs == 0) return ::testing::AssertionSuccess();
+  return ::testing::AssertionFailure()
+         << diffs << " bytes differ, first at " << first << ": " << int(actual[first])
+         << " instead of " << int(expected[first]);
+}
 
 // ---------------------------------------------------------------------------
 // Decoder fixture: geometry, clamping table, converter record, owner.
@@ -215,11 +272,16 @@ int components_of(int space) { return space == kColourGrey ? 1 : space >= kColou
 Px source_colour(int space, const Planes& s, int x, int y) {
   auto v = [&](int c) { return s.at(c, x, y); };
   switch (space) {
-    case kColourGrey: return {false, v(0), v(0), v(0)};
-    case kColourRgb: return {false, v(0), v(1), v(2)};
-    case kColourCmyk: return ref_cmyk(v(0), v(1), v(2), v(3));
-    case kColourYcck: return ref_ycck(v(0), v(1), v(2), v(3));
-    default: return {true, v(0), v(1), v(2)};
+    case kColourGrey:
+      return {false, v(0), v(0), v(0)};
+    case kColourRgb:
+      return {false, v(0), v(1), v(2)};
+    case kColourCmyk:
+      return ref_cmyk(v(0), v(1), v(2), v(3));
+    case kColourYcck:
+      return ref_ycck(v(0), v(1), v(2), v(3));
+    default:
+      return {true, v(0), v(1), v(2)};
   }
 }
 
@@ -247,8 +309,8 @@ void feed(Fixture& f, Planes& s, int first = 0, int end = -1) {
 Px average_of(int space, const Planes& s, int x0, int x1, int y0, int y1) {
   const Px q[4] = {source_colour(space, s, x0, y0), source_colour(space, s, x1, y0),
                    source_colour(space, s, x0, y1), source_colour(space, s, x1, y1)};
-  return {q[0].ycc, (q[0].a + q[1].a + q[2].a + q[3].a) / 4, (q[0].b + q[1].b + q[2].b + q[3].b) / 4,
-          (q[0].c + q[1].c + q[2].c + q[3].c) / 4};
+  return {q[0].ycc, (q[0].a + q[1].a + q[2].a + q[3].a) / 4,
+          (q[0].b + q[1].b + q[2].b + q[3].b) / 4, (q[0].c + q[1].c + q[2].c + q[3].c) / 4};
 }
 
 // Source row of output row j under centre sampling: while reducing, the
@@ -272,7 +334,9 @@ std::function<Px(int, int)> resized_reference(int space, const Planes& s, int dw
   const int sw = s.w, sh = s.h;
   if (centre) {
     const auto rows = centre_rows(sh, dh);
-    return [=, &s](int x, int y) { return source_colour(space, s, (sw / 2 + x * sw) / dw, rows[size_t(y)]); };
+    return [=, &s](int x, int y) {
+      return source_colour(space, s, (sw / 2 + x * sw) / dw, rows[size_t(y)]);
+    };
   }
   return [=, &s](int x, int y) {
     return average_of(space, s, (sw / 4 + x * sw) / dw, (3 * sw / 4 + x * sw) / dw,
@@ -303,36 +367,46 @@ void check_rows(int space, const std::function<void(int row, int col, uint8_t* c
     for (int x = 0; x < 256; ++x) fill(y, x, c);
   }
   feed(f, s);
-  EXPECT_EQ(canvas.buf, canvas.expect([&](int x, int y) { return source_colour(space, s, x, y); }));
+  EXPECT_TRUE(same_bytes(
+      canvas.buf, canvas.expect([&](int x, int y) { return source_colour(space, s, x, y); })));
 }
 
 TEST(ColourEquations, YccGridMatchesFixedPointReference) {
   const int luma[] = {0, 1, 64, 100, 128, 200, 254, 255};
   for (int y : luma) {
-    check_rows(kColourYcc, [y](int row, int col, uint8_t* const* c) {
-      c[0][col] = uint8_t(y);
-      c[1][col] = uint8_t(col);
-      c[2][col] = uint8_t(row);
-    }, 256);
+    check_rows(
+        kColourYcc,
+        [y](int row, int col, uint8_t* const* c) {
+          c[0][col] = uint8_t(y);
+          c[1][col] = uint8_t(col);
+          c[2][col] = uint8_t(row);
+        },
+        256);
   }
 }
 
 TEST(ColourEquations, CmykExactDivisionOverEveryProduct) {
-  check_rows(kColourCmyk, [](int row, int col, uint8_t* const* c) {
-    c[0][col] = uint8_t(col);
-    c[1][col] = uint8_t(255 - col);
-    c[2][col] = uint8_t(col ^ 0x5A);
-    c[3][col] = uint8_t(row);
-  }, 256);
+  check_rows(
+      kColourCmyk,
+      [](int row, int col, uint8_t* const* c) {
+        c[0][col] = uint8_t(col);
+        c[1][col] = uint8_t(255 - col);
+        c[2][col] = uint8_t(col ^ 0x5A);
+        c[3][col] = uint8_t(row);
+      },
+      256);
 }
 
 TEST(ColourEquations, YcckGridMatchesReference) {
-  check_rows(kColourYcck, [](int row, int col, uint8_t* const* c) {
-    c[0][col] = uint8_t(col);
-    c[1][col] = uint8_t(row);
-    c[2][col] = uint8_t(col * 7 + row);
-    c[3][col] = uint8_t(255 - row);
-  }, 256);
+  check_rows(
+      kColourYcck,
+      [](int row, int col, uint8_t* const* c) {
+        c[0][col] = uint8_t(col);
+        c[1][col] = uint8_t(row);
+        c[2][col] = uint8_t(col * 7 + row);
+        c[3][col] = uint8_t(255 - row);
+      },
+      256);
 }
 
 // One pixel through a 1:1 writer into a format; returns the bytes.
@@ -380,12 +454,12 @@ TEST_P(Layout, ConvertersWriteEveryFormatAndRotation) {
   const auto [format, rotation] = GetParam();
   const std::tuple<int, int, int, int, int> cases[] = {
       // space, source size, output size
-      {kColourGrey, 7, 5, 7, 5}, {kColourRgb, 7, 5, 7, 5},    {kColourCmyk, 7, 5, 7, 5},
-      {kColourYcck, 7, 5, 7, 5}, {kColourYcc, 7, 5, 7, 5},    {kColourYcc, 11, 9, 5, 4},
+      {kColourGrey, 7, 5, 7, 5},  {kColourRgb, 7, 5, 7, 5},  {kColourCmyk, 7, 5, 7, 5},
+      {kColourYcck, 7, 5, 7, 5},  {kColourYcc, 7, 5, 7, 5},  {kColourYcc, 11, 9, 5, 4},
       {kColourCmyk, 11, 9, 5, 4}, {kColourGrey, 4, 3, 9, 7}, {kColourRgb, 130, 8, 101, 5}};
   for (const auto& [space, sw, sh, dw, dh] : cases) {
-    SCOPED_TRACE(testing::Message() << "space " << space << " " << sw << "x" << sh << " -> "
-                                    << dw << "x" << dh);
+    SCOPED_TRACE(testing::Message()
+                 << "space " << space << " " << sw << "x" << sh << " -> " << dw << "x" << dh);
     Fixture f(space);
     ASSERT_EQ(f.select(sw, sh, dw, dh), 200);
     Canvas canvas(format, rotation, dw, dh);
@@ -393,9 +467,10 @@ TEST_P(Layout, ConvertersWriteEveryFormatAndRotation) {
     Planes s(components_of(space), sw, sh, uint32_t(space * 31 + sw));
     feed(f, s);
     const bool same = sw == dw && sh == dh;
-    const auto ref = same ? std::function<Px(int, int)>([&](int x, int y) { return source_colour(space, s, x, y); })
+    const auto ref = same ? std::function<Px(int, int)>(
+                                [&](int x, int y) { return source_colour(space, s, x, y); })
                           : resized_reference(space, s, dw, dh, is_centre(f.converter.convert));
-    EXPECT_EQ(canvas.buf, canvas.expect(ref));
+    EXPECT_TRUE(same_bytes(canvas.buf, canvas.expect(ref)));
     EXPECT_EQ(f.d->output_rows, uint32_t(dh));
   }
 }
@@ -424,17 +499,18 @@ TEST_P(Layout, FusedWritersWriteEveryFormatAndRotation) {
         writer(f.d.get(), luma.row(0, y), fam.v == 2 ? luma.row(0, y + 1) : nullptr,
                chroma.row(0, y / fam.v), chroma.row(1, y / fam.v), uint32_t(w));
       }
-      EXPECT_EQ(canvas.buf, canvas.expect([&](int x, int y) {
+      EXPECT_TRUE(same_bytes(canvas.buf, canvas.expect([&](int x, int y) {
         return Px{true, luma.at(0, x, y), chroma.at(0, x / fam.h, y / fam.v),
                   chroma.at(1, x / fam.h, y / fam.v)};
-      }));
+      })));
       EXPECT_EQ(f.d->output_rows, uint32_t(h));
     }
   }
 }
 
 INSTANTIATE_TEST_SUITE_P(AllFormats, Layout,
-                         ::testing::Combine(::testing::Range(0, 13), ::testing::Values(0, 4, 8, 12)));
+                         ::testing::Combine(::testing::Range(0, 13),
+                                            ::testing::Values(0, 4, 8, 12)));
 
 TEST(FusedSelection, NamedMembersByLayoutAndFormat) {
   EXPECT_EQ(vj_select_fused_writer(1, 0), &VETAJ_YcbcrWriteOutput1to1_YUV420_toRGB565);
@@ -458,10 +534,11 @@ class Resampling : public ::testing::TestWithParam<std::tuple<int, int>> {};
 
 TEST_P(Resampling, MatchesSamplingReference) {
   const auto [space, mode] = GetParam();
-  const int sizes[][4] = {{8, 8, 4, 4},     {9, 7, 4, 3},      {16, 16, 3, 5},   {13, 11, 5, 6},
-                          {5, 4, 13, 9},    {3, 2, 7, 7},      {1, 1, 4, 3},     {4, 3, 1, 1},
-                          {100, 60, 37, 23}, {250, 130, 120, 101}, {120, 110, 240, 200},
-                          {300, 7, 110, 3}, {61, 200, 29, 110}};
+  const int sizes[][4] = {{8, 8, 4, 4},         {9, 7, 4, 3},         {16, 16, 3, 5},
+                          {13, 11, 5, 6},       {5, 4, 13, 9},        {3, 2, 7, 7},
+                          {1, 1, 4, 3},         {4, 3, 1, 1},         {100, 60, 37, 23},
+                          {250, 130, 120, 101}, {120, 110, 240, 200}, {300, 7, 110, 3},
+                          {61, 200, 29, 110}};
   for (const auto& z : sizes) {
     SCOPED_TRACE(testing::Message() << z[0] << "x" << z[1] << " -> " << z[2] << "x" << z[3]);
     Fixture f(space);
@@ -470,17 +547,18 @@ TEST_P(Resampling, MatchesSamplingReference) {
     canvas.attach(*f.d);
     Planes s(components_of(space), z[0], z[1], uint32_t(z[0] * 1000 + z[1]));
     feed(f, s);
-    EXPECT_EQ(canvas.buf, canvas.expect(resized_reference(space, s, z[2], z[3],
-                                                          is_centre(f.converter.convert))));
+    EXPECT_TRUE(same_bytes(canvas.buf, canvas.expect(resized_reference(
+                                           space, s, z[2], z[3], is_centre(f.converter.convert)))));
     EXPECT_EQ(f.d->output_rows, uint32_t(z[3]));
   }
 }
 
-INSTANTIATE_TEST_SUITE_P(SpacesAndModes, Resampling,
-                         ::testing::Values(std::make_tuple(kColourYcc, 0), std::make_tuple(kColourYcc, 1),
-                                           std::make_tuple(kColourYcc, 2), std::make_tuple(kColourGrey, 0),
-                                           std::make_tuple(kColourRgb, 0), std::make_tuple(kColourCmyk, 0),
-                                           std::make_tuple(kColourYcck, 4)));
+INSTANTIATE_TEST_SUITE_P(
+    SpacesAndModes, Resampling,
+    ::testing::Values(std::make_tuple(kColourYcc, 0), std::make_tuple(kColourYcc, 1),
+                      std::make_tuple(kColourYcc, 2), std::make_tuple(kColourGrey, 0),
+                      std::make_tuple(kColourRgb, 0), std::make_tuple(kColourCmyk, 0),
+                      std::make_tuple(kColourYcck, 4)));
 
 TEST(ConverterChoice, FollowsSizeModeAndRegion) {
   struct Case {
@@ -494,7 +572,7 @@ TEST(ConverterChoice, FollowsSizeModeAndRegion) {
       {kColourYcc, 400, 300, 99, 99, 0, false, VETAJ_DoFastYcbcrToRgb},
       {kColourYcc, 400, 300, 99, 99, 0, true, VETAJ_DoFastYcbcrToRgb_Partial},
       {kColourYcc, 400, 300, 200, 150, 2, false, VETAJ_DoFastYcbcrToRgb},
-      {kColourYcc, 240, 240, 140, 140, 1, false, VETAJ_DoFastYcbcrToRgb},   // 7*240 <= 12*140
+      {kColourYcc, 240, 240, 140, 140, 1, false, VETAJ_DoFastYcbcrToRgb},  // 7*240 <= 12*140
       {kColourYcc, 241, 240, 140, 140, 1, false, VETAJ_DoYcbcrToRgb},
       {kColourYcc, 50, 50, 300, 300, 0, false, VETAJ_DoYcbcrToUpscaleRgb},
       {kColourYcc, 50, 50, 60, 60, 1, false, VETAJ_DoYcbcrToUpscaleRgb},
@@ -515,8 +593,8 @@ TEST(ConverterChoice, FollowsSizeModeAndRegion) {
     Fixture f(c.space);
     if (c.region) f.owner.region_mode = 1;
     ASSERT_EQ(f.select(c.sw, c.sh, c.dw, c.dh, c.mode), 200);
-    EXPECT_EQ(f.converter.convert, c.expected)
-        << c.space << " " << c.sw << "x" << c.sh << " -> " << c.dw << "x" << c.dh << " mode " << c.mode;
+    EXPECT_EQ(f.converter.convert, c.expected) << c.space << " " << c.sw << "x" << c.sh << " -> "
+                                               << c.dw << "x" << c.dh << " mode " << c.mode;
   }
   Fixture bad(0);
   EXPECT_EQ(bad.select(8, 8, 8, 8), 201);
@@ -543,7 +621,7 @@ TEST(Cursor, ZeroRowBatchOnlyClearsTheMoreOutputFlag) {
   EXPECT_EQ(f.d->resampler->more_output, 0u);
   EXPECT_EQ(f.d->output_rows, 0u);
   EXPECT_EQ(f.d->resampler->src_row, 0u);
-  EXPECT_EQ(canvas.buf, std::vector<uint8_t>(canvas.buf.size(), kSentinel));
+  EXPECT_TRUE(same_bytes(canvas.buf, std::vector<uint8_t>(canvas.buf.size(), kSentinel)));
 }
 
 TEST(Cursor, RowsBeyondTheVisibleHeightAreNotWritten) {
@@ -554,7 +632,9 @@ TEST(Cursor, RowsBeyondTheVisibleHeightAreNotWritten) {
   Planes s(1, 6, 7, 5);
   feed(f, s);  // four rows too many
   EXPECT_EQ(f.d->output_rows, 3u);
-  EXPECT_EQ(canvas.buf, canvas.expect([&](int x, int y) { return source_colour(kColourGrey, s, x, y); }));
+  EXPECT_TRUE(same_bytes(canvas.buf, canvas.expect([&](int x, int y) {
+    return source_colour(kColourGrey, s, x, y);
+  })));
 }
 
 // Calls wider than the visible width (the row length of a buffer larger
@@ -567,8 +647,10 @@ TEST(Cursor, WideCallsAreClippedToTheVisibleWidth) {
   Planes s(3, 16, 2, 21);
   const uint8_t* row0[3] = {s.row(0, 0), s.row(1, 0), s.row(2, 0)};
   VETAJ_YcbcrWriteOutput1to1(f.d.get(), row0, 12);
-  VETAJ_YcbcrWriteOutput1to1_YUV444_toRGBA8888(f.d.get(), s.row(0, 1), nullptr, s.row(1, 1), s.row(2, 1), 12);
-  EXPECT_EQ(canvas.buf, canvas.expect([&](int x, int y) { return source_colour(kColourYcc, s, x, y); }));
+  VETAJ_YcbcrWriteOutput1to1_YUV444_toRGBA8888(f.d.get(), s.row(0, 1), nullptr, s.row(1, 1),
+                                               s.row(2, 1), 12);
+  EXPECT_TRUE(same_bytes(
+      canvas.buf, canvas.expect([&](int x, int y) { return source_colour(kColourYcc, s, x, y); })));
 }
 
 TEST(Cursor, CropOffsetShiftsTheFirstSourceColumn) {
@@ -585,7 +667,9 @@ TEST(Cursor, CropOffsetShiftsTheFirstSourceColumn) {
   canvas.attach(*f.d);
   Planes s(3, 12, 2, 9);
   feed(f, s);
-  EXPECT_EQ(canvas.buf, canvas.expect([&](int x, int y) { return source_colour(kColourRgb, s, x + 3, y); }));
+  EXPECT_TRUE(same_bytes(canvas.buf, canvas.expect([&](int x, int y) {
+    return source_colour(kColourRgb, s, x + 3, y);
+  })));
 }
 
 // ---------------------------------------------------------------------------
@@ -598,8 +682,9 @@ class RegionColumns : public ::testing::TestWithParam<std::tuple<uint32_t, uint3
 // an odd first column starts with a single pixel.
 TEST_P(RegionColumns, FusedWriterHonoursWindowEdgesAndFirstColumn) {
   const auto [path, left] = GetParam();
-  const uint32_t mask_of[23] = {0, 14, 6, 0, 2, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 62, 30, 63, 31, 6, 3, 1};
-  const int first = int(left & mask_of[path]);
+  const uint32_t mask_of[23] = {0, 14, 6, 0, 2,  0,  0,  0,  0, 0, 0, 0,
+                                0, 0,  0, 0, 62, 30, 63, 31, 6, 3, 1};
+  const int first = int(path < 23 ? left & mask_of[path] : 0);
   const int top = 3, rw = 5, rh = 4;
   for (const int format : {7, 0, 2}) {
     Fixture f(kColourYcc);
@@ -613,10 +698,12 @@ TEST_P(RegionColumns, FusedWriterHonoursWindowEdgesAndFirstColumn) {
       VETAJ_YcbcrWriteOutput1to1_YUV420(f.d.get(), luma.row(0, y), luma.row(0, y + 1),
                                         chroma.row(0, y / 2), chroma.row(1, y / 2), rw);
     EXPECT_EQ(f.d->output_rows, uint32_t(rh));
-    EXPECT_EQ(canvas.buf, canvas.expect([&](int x, int y) {
+    EXPECT_TRUE(same_bytes(canvas.buf, canvas.expect([&](int x, int y) {
       const int sx = first + x, sy = top + y;
-      return Px{true, luma.at(0, sx, sy), chroma.at(0, sx / 2, sy / 2), chroma.at(1, sx / 2, sy / 2)};
-    })) << "format " << format;
+      return Px{true, luma.at(0, sx, sy), chroma.at(0, sx / 2, sy / 2),
+                chroma.at(1, sx / 2, sy / 2)};
+    }))) << "format "
+         << format;
   }
 }
 
@@ -624,8 +711,9 @@ TEST_P(RegionColumns, FusedWriterHonoursWindowEdgesAndFirstColumn) {
 // region's first column.
 TEST_P(RegionColumns, PartialConvertersWriteOnlyTheWindow) {
   const auto [path, left] = GetParam();
-  const uint32_t mask_of[23] = {0, 14, 6, 0, 2, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 62, 30, 63, 31, 6, 3, 1};
-  const int first = int(left & mask_of[path]);
+  const uint32_t mask_of[23] = {0, 14, 6, 0, 2,  0,  0,  0,  0, 0, 0, 0,
+                                0, 0,  0, 0, 62, 30, 63, 31, 6, 3, 1};
+  const int first = int(path < 23 ? left & mask_of[path] : 0);
   for (const int space : {kColourYcc, kColourCmyk, kColourGrey}) {
     Fixture f(space);
     f.region(left, 2, 6, 3, path);
@@ -634,7 +722,9 @@ TEST_P(RegionColumns, PartialConvertersWriteOnlyTheWindow) {
     canvas.attach(*f.d);
     Planes s(components_of(space), 128, 9, 11);
     feed(f, s);
-    EXPECT_EQ(canvas.buf, canvas.expect([&](int x, int y) { return source_colour(space, s, first + x, y + 2); }));
+    EXPECT_TRUE(same_bytes(canvas.buf, canvas.expect([&](int x, int y) {
+      return source_colour(space, s, first + x, y + 2);
+    })));
   }
 }
 

@@ -188,9 +188,9 @@ bool valid_span(int32_t offset, int32_t length, uint32_t full) {
 
 using namespace vj::colour;
 
-#define VETAJ_CONVERTER_ENTRY(name, source, scheme)                  \
+#define VETAJ_CONVERTER_ENTRY(name, source, scheme)                        \
   void name(DecoderInfo* d, uint8_t* const* const* rows, uint32_t count) { \
-    convert<source, Scheme::scheme>(d, rows, count);                 \
+    convert<source, Scheme::scheme>(d, rows, count);                       \
   }
 // The partial forms differ only in being chosen in region mode (the row
 // window applies whenever the owner is in region mode), and the upscaling

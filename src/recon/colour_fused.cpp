@@ -73,16 +73,16 @@ void write_fused(DecoderInfo* d, const uint8_t* y0, const uint8_t* y1, const uin
   }
   const uint32_t first = first_source_column(d);
   const uint8_t* range_limit = d->range_limit;
-  write_rows<Format>(d, wanted, width, [&](const auto* sinks, const uint32_t* rows,
-                                           uint32_t count, uint32_t n) {
-    const uint8_t* luma[2] = {y0, y1};
-    const uint8_t* picked[2] = {luma[rows[0]], luma[rows[count - 1]]};
-    if (count == 2) {
-      fused_span<kH, 2>(sinks, picked, cb, cr, first, n, range_limit);
-    } else {
-      fused_span<kH, 1>(sinks, picked, cb, cr, first, n, range_limit);
-    }
-  });
+  write_rows<Format>(d, wanted, width,
+                     [&](const auto* sinks, const uint32_t* rows, uint32_t count, uint32_t n) {
+                       const uint8_t* luma[2] = {y0, y1};
+                       const uint8_t* picked[2] = {luma[rows[0]], luma[rows[count - 1]]};
+                       if (count == 2) {
+                         fused_span<kH, 2>(sinks, picked, cb, cr, first, n, range_limit);
+                       } else {
+                         fused_span<kH, 1>(sinks, picked, cb, cr, first, n, range_limit);
+                       }
+                     });
 }
 
 // The general member: any format, chosen once per call.
@@ -113,15 +113,15 @@ using Yuv444 = FusedFamily<1, 1>;
 using namespace vj::colour;
 
 // The sixteen named members, each a thin entry into the family template.
-#define VETAJ_FUSED_MEMBER(name, family, member)                                            \
-  void name(DecoderInfo* d, const uint8_t* y0, const uint8_t* y1, const uint8_t* cb,        \
-            const uint8_t* cr, uint32_t width) {                                            \
-    family::member(d, y0, y1, cb, cr, width);                                               \
+#define VETAJ_FUSED_MEMBER(name, family, member)                                     \
+  void name(DecoderInfo* d, const uint8_t* y0, const uint8_t* y1, const uint8_t* cb, \
+            const uint8_t* cr, uint32_t width) {                                     \
+    family::member(d, y0, y1, cb, cr, width);                                        \
   }
-#define VETAJ_FUSED_FAMILY(prefix, family)                     \
-  VETAJ_FUSED_MEMBER(prefix, family, kAny)                     \
-  VETAJ_FUSED_MEMBER(prefix##_toRGB565, family, kRgb565)       \
-  VETAJ_FUSED_MEMBER(prefix##_toRGBA8888, family, kRgba)       \
+#define VETAJ_FUSED_FAMILY(prefix, family)               \
+  VETAJ_FUSED_MEMBER(prefix, family, kAny)               \
+  VETAJ_FUSED_MEMBER(prefix##_toRGB565, family, kRgb565) \
+  VETAJ_FUSED_MEMBER(prefix##_toRGBA8888, family, kRgba) \
   VETAJ_FUSED_MEMBER(prefix##_toBGRA8888, family, kBgra)
 
 VETAJ_FUSED_FAMILY(VETAJ_YcbcrWriteOutput1to1_YUV420, Yuv420)
@@ -148,6 +148,9 @@ FusedWriterFn vj_select_fused_writer(int32_t fused_code, int32_t output_format) 
        VETAJ_YcbcrWriteOutput1to1_YUV444_toBGRA8888, VETAJ_YcbcrWriteOutput1to1_YUV444},
   };
   if (fused_code < 1 || fused_code > 4) return nullptr;
-  const int32_t column = output_format == 0 ? 0 : output_format == 7 ? 1 : output_format == 8 ? 2 : 3;
+  const int32_t column = output_format == 0   ? 0
+                         : output_format == 7 ? 1
+                         : output_format == 8 ? 2
+                                              : 3;
   return kWriters[fused_code - 1][column];
 }

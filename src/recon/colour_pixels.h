@@ -90,7 +90,9 @@ struct YccSource {
     const uint8_t* __restrict cb;
     const uint8_t* __restrict cr;
   };
-  static Row row(ComponentRows c, uint32_t first) { return {c[0] + first, c[1] + first, c[2] + first}; }
+  static Row row(ComponentRows c, uint32_t first) {
+    return {c[0] + first, c[1] + first, c[2] + first};
+  }
   static Ycc at(const Row& s, uint32_t x, const uint8_t*) { return {s.y[x], s.cb[x], s.cr[x]}; }
 };
 
@@ -115,7 +117,9 @@ struct RgbSource {
     const uint8_t* __restrict g;
     const uint8_t* __restrict b;
   };
-  static Row row(ComponentRows c, uint32_t first) { return {c[0] + first, c[1] + first, c[2] + first}; }
+  static Row row(ComponentRows c, uint32_t first) {
+    return {c[0] + first, c[1] + first, c[2] + first};
+  }
   static Rgb at(const Row& s, uint32_t x, const uint8_t*) { return {s.r[x], s.g[x], s.b[x]}; }
 };
 
@@ -163,6 +167,7 @@ struct YcckSource {
 
 enum class Kind { kPacked, kPlanar, kCount };
 
+// Little-endian stores of 4 and 2 bytes.
 inline void store_word(uint8_t* p, uint32_t v) {
   if constexpr (std::endian::native == std::endian::little) {
     std::memcpy(p, &v, 4);
@@ -173,15 +178,22 @@ inline void store_word(uint8_t* p, uint32_t v) {
     p[3] = uint8_t(v >> 24);
   }
 }
+inline void store_half(uint8_t* p, uint32_t v) {
+  if constexpr (std::endian::native == std::endian::little) {
+    const uint16_t h = uint16_t(v);
+    std::memcpy(p, &h, 2);
+  } else {
+    p[0] = uint8_t(v);
+    p[1] = uint8_t(v >> 8);
+  }
+}
 
 // RGB565 little-endian word, truncated channels.
 struct Rgb565 {
   static constexpr Kind kKind = Kind::kPacked;
   static constexpr int32_t kBytes = 2;
   static void store(uint8_t* p, int32_t r, int32_t g, int32_t b) {
-    const uint32_t v = (uint32_t(r >> 3) << 11) | (uint32_t(g >> 2) << 5) | uint32_t(b >> 3);
-    p[0] = uint8_t(v);
-    p[1] = uint8_t(v >> 8);
+    store_half(p, (uint32_t(r >> 3) << 11) | (uint32_t(g >> 2) << 5) | uint32_t(b >> 3));
   }
 };
 
@@ -227,13 +239,33 @@ struct CountOnly {
 template <class F>
 void with_format(int32_t format, F&& f) {
   switch (format) {
-    case 0: case 9: case 10: f(Rgb565{}); break;
-    case 1: case 3: case 6: case 11: f(Rgb888{}); break;
-    case 2: f(Planar{}); break;
-    case 5: f(Argb{}); break;
-    case 7: case 12: f(Rgba{}); break;
-    case 8: f(Bgra{}); break;
-    default: f(CountOnly{}); break;
+    case 0:
+    case 9:
+    case 10:
+      f(Rgb565{});
+      break;
+    case 1:
+    case 3:
+    case 6:
+    case 11:
+      f(Rgb888{});
+      break;
+    case 2:
+      f(Planar{});
+      break;
+    case 5:
+      f(Argb{});
+      break;
+    case 7:
+    case 12:
+      f(Rgba{});
+      break;
+    case 8:
+      f(Bgra{});
+      break;
+    default:
+      f(CountOnly{});
+      break;
   }
 }
 
@@ -269,8 +301,8 @@ struct PackedSink {
 // plane: written when both are even.
 inline void put_chroma_by_position(const DecoderInfo* d, const uint8_t* luma, int32_t cb,
                                    int32_t cr) {
-  if (d->y_plane == nullptr || d->u_plane == nullptr || d->v_plane == nullptr ||
-      d->y_stride == 0 || luma < d->y_plane)
+  if (d->y_plane == nullptr || d->u_plane == nullptr || d->v_plane == nullptr || d->y_stride == 0 ||
+      luma < d->y_plane)
     return;
   const size_t offset = size_t(luma - d->y_plane);
   const size_t x = offset % d->y_stride;
@@ -321,7 +353,7 @@ struct PlanarSink {
 
 // Column masks of the region rule, by decode-path code.
 inline uint32_t region_column_mask(uint32_t path_code) {
-  static constexpr uint8_t kMask[23] = {0, 14, 6, 0, 2, 0, 0,  0,  0,  0,  0, 0,
+  static constexpr uint8_t kMask[23] = {0, 14, 6, 0, 2,  0,  0,  0,  0, 0, 0, 0,
                                         0, 0,  0, 0, 62, 30, 63, 31, 6, 3, 1};
   return path_code < 23 ? kMask[path_code] : 0;
 }
@@ -396,11 +428,15 @@ void write_rows(DecoderInfo* d, uint32_t wanted, uint32_t width, Body&& body) {
       };
       const bool unit = d->pixel_step == 1;
       if constexpr (Format::kKind == Kind::kPlanar) {
-        if (unit) run(TypeTag<PlanarSink<true>>{});
-        else run(TypeTag<PlanarSink<false>>{});
+        if (unit)
+          run(TypeTag<PlanarSink<true>>{});
+        else
+          run(TypeTag<PlanarSink<false>>{});
       } else {
-        if (unit) run(TypeTag<PackedSink<Format, true>>{});
-        else run(TypeTag<PackedSink<Format, false>>{});
+        if (unit)
+          run(TypeTag<PackedSink<Format, true>>{});
+        else
+          run(TypeTag<PackedSink<Format, false>>{});
       }
     }
   }

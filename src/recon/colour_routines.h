@@ -11,7 +11,7 @@
 // Fused upsample-and-convert writers (FusedWriterFn). The 4:2:0 and H1V2
 // members write two rows per call, the others one. The members without a
 // format suffix write any format; the others RGB565, RGBA8888, BGRA8888.
-#define VETAJ_FUSED_WRITER(name)                                                              \
+#define VETAJ_FUSED_WRITER(name)                                                           \
   void name(DecoderInfo* decoder, const uint8_t* y0, const uint8_t* y1, const uint8_t* cb, \
             const uint8_t* cr, uint32_t width)
 VETAJ_FUSED_WRITER(VETAJ_YcbcrWriteOutput1to1_YUV420);

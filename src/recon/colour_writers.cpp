@@ -13,11 +13,12 @@ void write_mapped(DecoderInfo* d, ComponentRows components, uint32_t width, Map 
   const typename Src::Row src = Src::row(components, first_source_column(d));
   const uint8_t* range_limit = d->range_limit;
   with_format(d->output_format, [&](auto format) {
-    write_rows<decltype(format)>(d, 1, width, [&](const auto* sinks, const uint32_t*, uint32_t,
-                                                  uint32_t n) {
-      const auto sink = sinks[0];
-      for (uint32_t i = 0; i < n; ++i) sink.put(i, Src::at(src, map(i), range_limit));
-    });
+    write_rows<decltype(format)>(d, 1, width,
+                                 [&](const auto* sinks, const uint32_t*, uint32_t, uint32_t n) {
+                                   const auto sink = sinks[0];
+                                   for (uint32_t i = 0; i < n; ++i)
+                                     sink.put(i, Src::at(src, map(i), range_limit));
+                                 });
   });
 }
 
@@ -38,11 +39,12 @@ void write_sampled(DecoderInfo* d, ComponentRows components, uint32_t width) {
 template <class Colour>
 void write_packed(DecoderInfo* d, const uint32_t* packed, uint32_t width) {
   with_format(d->output_format, [&](auto format) {
-    write_rows<decltype(format)>(d, 1, width, [&](const auto* sinks, const uint32_t*, uint32_t,
-                                                  uint32_t n) {
-      const auto sink = sinks[0];
-      for (uint32_t i = 0; i < n; ++i) sink.put(i, unpack_average<Colour>(packed[i]));
-    });
+    write_rows<decltype(format)>(d, 1, width,
+                                 [&](const auto* sinks, const uint32_t*, uint32_t, uint32_t n) {
+                                   const auto sink = sinks[0];
+                                   for (uint32_t i = 0; i < n; ++i)
+                                     sink.put(i, unpack_average<Colour>(packed[i]));
+                                 });
   });
 }
 
@@ -72,8 +74,7 @@ void VETAJ_YCCKWriteOutput1to1(DecoderInfo* d, const uint8_t* const* c, uint32_t
 void VETAJ_FastYcbcrWriteOutput(DecoderInfo* d, const uint8_t* const* c, uint32_t width) {
   write_sampled<YccSource>(d, c, width);
 }
-void VETAJ_FastYcbcrUpscaleWriteOutput(DecoderInfo* d, const uint8_t* const* c,
-                                       uint32_t width) {
+void VETAJ_FastYcbcrUpscaleWriteOutput(DecoderInfo* d, const uint8_t* const* c, uint32_t width) {
   write_sampled<YccSource>(d, c, width);
 }
 
