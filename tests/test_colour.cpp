@@ -74,44 +74,19 @@ int bytes_of(int format) {
 }
 void encode(int format, const std::array<int, 3>& c, uint8_t* p) {
   const int r = c[0], g = c[1], b = c[2];
-  switch (format) {
-    case 0:
-    case 9:
-    case 10: {
-      const int v = ((r >> 3) << 11) | ((g >> 2) << 5) | (b >> 3);
-      p[0] = uint8_t(v & 255);
-      p[1] = uint8_t(v >> 8);
-      break;
-    }
-    case 1:
-    case 3:
-    case 6:
-    case 11:
-      p[0] = uint8_t(r);
-      p[1] = uint8_t(g);
-      p[2] = uint8_t(b);
-      break;
-    case 5:
-      p[0] = 255;
-      p[1] = uint8_t(r);
-      p[2] = uint8_t(g);
-      p[3] = uint8_t(b);
-      break;
-    case 7:
-    case 12:
-      p[0] = uint8_t(r);
-      p[1] = uint8_t(g);
-      p[2] = uint8_t(b);
-      p[3] = 255;
-      break;
-    case 8:
-      p[0] = uint8_t(b);
-      p[1] = uint8_t(g);
-      p[2] = uint8_t(r);
-      p[3] = 255;
-      break;
-    default:
-      break;
+  if (bytes_of(format) == 2) {
+    const int v = ((r >> 3) << 11) | ((g >> 2) << 5) | (b >> 3);
+    p[0] = uint8_t(v & 255);
+    p[1] = uint8_t(v >> 8);
+    return;
+  }
+  const char* order = format == 5                   ? "ARGB"
+                      : format == 8                 ? "BGRA"
+                      : format == 7 || format == 12 ? "RGBA"
+                                                    : "RGB";
+  for (size_t i = 0; i < std::strlen(order); ++i) {
+    const char k = order[i];
+    p[i] = uint8_t(k == 'R' ? r : k == 'G' ? g : k == 'B' ? b : 255);
   }
 }
 
@@ -242,6 +217,12 @@ struct Fixture {
     d->decode_mode = mode;
     return vj_select_converter(d.get());
   }
+  // A sentinel-filled canvas of the visible size, attached to the cursor.
+  Canvas attach(int format, int rotation = 0, int margin_x = 3, int margin_y = 1) {
+    Canvas canvas(format, rotation, d->visible_width, d->visible_height, margin_x, margin_y);
+    canvas.attach(*d);
+    return canvas;
+  }
   void region(uint32_t left, uint32_t top, uint32_t width, uint32_t height, uint32_t path) {
     owner.region_mode = 1;
     owner.region_left = left;
@@ -283,6 +264,14 @@ Px source_colour(int space, const Planes& s, int x, int y) {
     default:
       return {true, v(0), v(1), v(2)};
   }
+}
+
+// The canvas holds the source picture from column dx and row dy, 1:1.
+::testing::AssertionResult holds_picture(const Canvas& canvas, int space, const Planes& s,
+                                         int dx = 0, int dy = 0) {
+  return same_bytes(canvas.buf, canvas.expect([&](int x, int y) {
+    return source_colour(space, s, x + dx, y + dy);
+  }));
 }
 
 // Hands rows first..end-1 of the planes to the converter in batches of
@@ -352,69 +341,45 @@ bool is_centre(ConvertFn fn) {
 // ---------------------------------------------------------------------------
 // Colour equations.
 
-// Writes one 256-pixel row per `row_value` through a 1:1 writer into RGBA and
-// compares every pixel with the reference.
-void check_rows(int space, const std::function<void(int row, int col, uint8_t* const* c)>& fill,
-                int rows) {
+// Fills a 256 x 256 picture with sample(row, column, component), writes it
+// through the 1:1 path into RGBA and compares every pixel with the reference.
+void check_grid(int space, const std::function<int(int row, int col, int comp)>& sample) {
   Fixture f(space);
-  ASSERT_EQ(f.select(256, rows, 256, rows), 200);
-  Canvas canvas(7, 0, 256, rows, 0, 0);
-  canvas.attach(*f.d);
-  Planes s(components_of(space), 256, rows, 1);
-  for (int y = 0; y < rows; ++y) {
-    uint8_t* c[4] = {s.row(0, y), nullptr, nullptr, nullptr};
-    for (int k = 1; k < components_of(space); ++k) c[k] = s.row(k, y);
-    for (int x = 0; x < 256; ++x) fill(y, x, c);
+  ASSERT_EQ(f.select(256, 256, 256, 256), 200);
+  Canvas canvas = f.attach(7, 0, 0, 0);
+  Planes s(components_of(space), 256, 256, 1);
+  for (int c = 0; c < components_of(space); ++c) {
+    for (int y = 0; y < 256; ++y) {
+      for (int x = 0; x < 256; ++x) s.row(c, y)[x] = uint8_t(sample(y, x, c));
+    }
   }
   feed(f, s);
-  EXPECT_TRUE(same_bytes(
-      canvas.buf, canvas.expect([&](int x, int y) { return source_colour(space, s, x, y); })));
+  EXPECT_TRUE(holds_picture(canvas, space, s));
 }
 
-TEST(ColourEquations, YccGridMatchesFixedPointReference) {
-  const int luma[] = {0, 1, 64, 100, 128, 200, 254, 255};
-  for (int y : luma) {
-    check_rows(
-        kColourYcc,
-        [y](int row, int col, uint8_t* const* c) {
-          c[0][col] = uint8_t(y);
-          c[1][col] = uint8_t(col);
-          c[2][col] = uint8_t(row);
-        },
-        256);
+// YCbCr over every chroma pair at several luma values; CMYK over every
+// product of a channel and black (the exact division); YCCK over a grid.
+TEST(ColourEquations, GridsMatchFixedPointReferences) {
+  for (const int luma : {0, 1, 64, 100, 128, 200, 254, 255}) {
+    check_grid(kColourYcc, [luma](int row, int col, int c) {
+      return c == 0 ? luma : c == 1 ? col : row;
+    });
   }
-}
-
-TEST(ColourEquations, CmykExactDivisionOverEveryProduct) {
-  check_rows(
-      kColourCmyk,
-      [](int row, int col, uint8_t* const* c) {
-        c[0][col] = uint8_t(col);
-        c[1][col] = uint8_t(255 - col);
-        c[2][col] = uint8_t(col ^ 0x5A);
-        c[3][col] = uint8_t(row);
-      },
-      256);
-}
-
-TEST(ColourEquations, YcckGridMatchesReference) {
-  check_rows(
-      kColourYcck,
-      [](int row, int col, uint8_t* const* c) {
-        c[0][col] = uint8_t(col);
-        c[1][col] = uint8_t(row);
-        c[2][col] = uint8_t(col * 7 + row);
-        c[3][col] = uint8_t(255 - row);
-      },
-      256);
+  check_grid(kColourCmyk, [](int row, int col, int c) {
+    const int v[4] = {col, 255 - col, col ^ 0x5A, row};
+    return v[c];
+  });
+  check_grid(kColourYcck, [](int row, int col, int c) {
+    const int v[4] = {col, row, col * 7 + row, 255 - row};
+    return v[c];
+  });
 }
 
 // One pixel through a 1:1 writer into a format; returns the bytes.
 std::vector<uint8_t> one_pixel(int space, int format, std::vector<uint8_t> samples) {
   Fixture f(space);
   f.select(1, 1, 1, 1);
-  Canvas canvas(format, 0, 1, 1, 0, 0);
-  canvas.attach(*f.d);
+  Canvas canvas = f.attach(format, 0, 0, 0);
   const uint8_t* c[4] = {};
   for (size_t k = 0; k < samples.size(); ++k) c[k] = &samples[k];
   const auto writer = space == kColourYcc    ? VETAJ_YcbcrWriteOutput1to1
@@ -462,8 +427,7 @@ TEST_P(Layout, ConvertersWriteEveryFormatAndRotation) {
                  << "space " << space << " " << sw << "x" << sh << " -> " << dw << "x" << dh);
     Fixture f(space);
     ASSERT_EQ(f.select(sw, sh, dw, dh), 200);
-    Canvas canvas(format, rotation, dw, dh);
-    canvas.attach(*f.d);
+    Canvas canvas = f.attach(format, rotation);
     Planes s(components_of(space), sw, sh, uint32_t(space * 31 + sw));
     feed(f, s);
     const bool same = sw == dw && sh == dh;
@@ -488,8 +452,7 @@ TEST_P(Layout, FusedWritersWriteEveryFormatAndRotation) {
       const int h = 5, padded_h = 6;
       Fixture f(kColourYcc);
       ASSERT_EQ(f.select(w, h, w, h), 200);
-      Canvas canvas(format, rotation, w, h);
-      canvas.attach(*f.d);
+      Canvas canvas = f.attach(format, rotation);
       const int cw = (w + fam.h - 1) / fam.h, ch = padded_h / fam.v;
       Planes luma(1, w, padded_h, uint32_t(w + 7 * fam.code));
       Planes chroma(2, cw, ch, uint32_t(w * 3 + fam.code));
@@ -543,8 +506,7 @@ TEST_P(Resampling, MatchesSamplingReference) {
     SCOPED_TRACE(testing::Message() << z[0] << "x" << z[1] << " -> " << z[2] << "x" << z[3]);
     Fixture f(space);
     ASSERT_EQ(f.select(z[0], z[1], z[2], z[3], mode), 200);
-    Canvas canvas(7, 0, z[2], z[3]);
-    canvas.attach(*f.d);
+    Canvas canvas = f.attach(7);
     Planes s(components_of(space), z[0], z[1], uint32_t(z[0] * 1000 + z[1]));
     feed(f, s);
     EXPECT_TRUE(same_bytes(canvas.buf, canvas.expect(resized_reference(
@@ -613,8 +575,7 @@ TEST(ConverterChoice, FollowsSizeModeAndRegion) {
 TEST(Cursor, ZeroRowBatchOnlyClearsTheMoreOutputFlag) {
   Fixture f(kColourYcc);
   ASSERT_EQ(f.select(8, 8, 4, 4), 200);
-  Canvas canvas(7, 0, 4, 4);
-  canvas.attach(*f.d);
+  Canvas canvas = f.attach(7);
   f.d->resampler->more_output = 1;
   uint8_t* const* none[3] = {};
   f.converter.convert(f.d.get(), none, 0);
@@ -627,14 +588,11 @@ TEST(Cursor, ZeroRowBatchOnlyClearsTheMoreOutputFlag) {
 TEST(Cursor, RowsBeyondTheVisibleHeightAreNotWritten) {
   Fixture f(kColourGrey);
   ASSERT_EQ(f.select(6, 3, 6, 3), 200);
-  Canvas canvas(8, 8, 6, 3);
-  canvas.attach(*f.d);
+  Canvas canvas = f.attach(8, 8);
   Planes s(1, 6, 7, 5);
   feed(f, s);  // four rows too many
   EXPECT_EQ(f.d->output_rows, 3u);
-  EXPECT_TRUE(same_bytes(canvas.buf, canvas.expect([&](int x, int y) {
-    return source_colour(kColourGrey, s, x, y);
-  })));
+  EXPECT_TRUE(holds_picture(canvas, kColourGrey, s));
 }
 
 // Calls wider than the visible width (the row length of a buffer larger
@@ -642,15 +600,13 @@ TEST(Cursor, RowsBeyondTheVisibleHeightAreNotWritten) {
 TEST(Cursor, WideCallsAreClippedToTheVisibleWidth) {
   Fixture f(kColourYcc);
   ASSERT_EQ(f.select(5, 2, 5, 2), 200);
-  Canvas canvas(7, 0, 5, 2);
-  canvas.attach(*f.d);
+  Canvas canvas = f.attach(7);
   Planes s(3, 16, 2, 21);
   const uint8_t* row0[3] = {s.row(0, 0), s.row(1, 0), s.row(2, 0)};
   VETAJ_YcbcrWriteOutput1to1(f.d.get(), row0, 12);
   VETAJ_YcbcrWriteOutput1to1_YUV444_toRGBA8888(f.d.get(), s.row(0, 1), nullptr, s.row(1, 1),
                                                s.row(2, 1), 12);
-  EXPECT_TRUE(same_bytes(
-      canvas.buf, canvas.expect([&](int x, int y) { return source_colour(kColourYcc, s, x, y); })));
+  EXPECT_TRUE(holds_picture(canvas, kColourYcc, s));
 }
 
 TEST(Cursor, CropOffsetShiftsTheFirstSourceColumn) {
@@ -663,13 +619,10 @@ TEST(Cursor, CropOffsetShiftsTheFirstSourceColumn) {
   f.d->cropped_reduced_height = f.d->visible_height = 2;
   f.d->reduced_height = 2;
   ASSERT_EQ(vj_select_converter(f.d.get()), 200);
-  Canvas canvas(1, 0, 7, 2);
-  canvas.attach(*f.d);
+  Canvas canvas = f.attach(1);
   Planes s(3, 12, 2, 9);
   feed(f, s);
-  EXPECT_TRUE(same_bytes(canvas.buf, canvas.expect([&](int x, int y) {
-    return source_colour(kColourRgb, s, x + 3, y);
-  })));
+  EXPECT_TRUE(holds_picture(canvas, kColourRgb, s, 3, 0));
 }
 
 // ---------------------------------------------------------------------------
@@ -690,8 +643,7 @@ TEST_P(RegionColumns, FusedWriterHonoursWindowEdgesAndFirstColumn) {
     Fixture f(kColourYcc);
     f.region(left, uint32_t(top), rw, rh, path);
     ASSERT_EQ(f.select(rw, rh, rw, rh), 200);
-    Canvas canvas(format, 0, rw, rh, 2, 2);
-    canvas.attach(*f.d);
+    Canvas canvas = f.attach(format, 0, 2, 2);
     Planes luma(1, 128, 10, 3), chroma(2, 64, 5, 4);
     vj_converter_set_row(f.d.get(), 2);
     for (int y = 2; y < 10; y += 2)
@@ -718,13 +670,10 @@ TEST_P(RegionColumns, PartialConvertersWriteOnlyTheWindow) {
     Fixture f(space);
     f.region(left, 2, 6, 3, path);
     ASSERT_EQ(f.select(6, 3, 6, 3), 200);
-    Canvas canvas(5, 12, 6, 3);
-    canvas.attach(*f.d);
+    Canvas canvas = f.attach(5, 12);
     Planes s(components_of(space), 128, 9, 11);
     feed(f, s);
-    EXPECT_TRUE(same_bytes(canvas.buf, canvas.expect([&](int x, int y) {
-      return source_colour(space, s, first + x, y + 2);
-    })));
+    EXPECT_TRUE(holds_picture(canvas, space, s, first, 2));
   }
 }
 

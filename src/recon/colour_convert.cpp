@@ -12,41 +12,11 @@
 // When the sizes are equal every row goes straight to the 1:1 writer.
 #include <cstring>
 
-#include "recon/colour_pixels.h"
 #include "recon/colour_routines.h"
+#include "recon/colour_rows.h"
 
 namespace vj::colour {
 namespace {
-
-// The named per-row writers of each source.
-template <class Src>
-struct Writers;
-template <>
-struct Writers<YccSource> {
-  static constexpr auto kOneToOne = VETAJ_YcbcrWriteOutput1to1;
-  static constexpr auto kPacked = VETAJ_YcbcrWriteOutput;
-  static constexpr auto kSampled = VETAJ_FastYcbcrWriteOutput;
-};
-template <>
-struct Writers<GreySource> {
-  static constexpr auto kOneToOne = VETAJ_GrayWriteOutput1to1;
-  static constexpr auto kPacked = VETAJ_GrayWriteOutput;
-};
-template <>
-struct Writers<RgbSource> {
-  static constexpr auto kOneToOne = VETAJ_RGBWriteOutput1to1;
-  static constexpr auto kPacked = VETAJ_RGBWriteOutput;
-};
-template <>
-struct Writers<CmykSource> {
-  static constexpr auto kOneToOne = VETAJ_CMYKWriteOutput1to1;
-  static constexpr auto kPacked = VETAJ_RGBWriteOutput;
-};
-template <>
-struct Writers<YcckSource> {
-  static constexpr auto kOneToOne = VETAJ_YCCKWriteOutput1to1;
-  static constexpr auto kPacked = VETAJ_RGBWriteOutput;
-};
 
 enum class Scheme { kAverage, kCentre };
 
@@ -70,7 +40,7 @@ inline uint32_t centre_point(uint32_t j, uint32_t s, uint32_t d) {
 // Packed sums of the two sample columns of every output column.
 template <class Src>
 void horizontal_sums(const DecoderInfo* d, Resampler* r, ComponentRows components) {
-  const typename Src::Row src = Src::row(components, first_source_column(d));
+  const auto src = source_row<Src>(components, first_source_column(d));
   const uint8_t* range_limit = d->range_limit;
   const uint32_t* __restrict a = r->col_a;
   const uint32_t* __restrict b = r->col_b;
@@ -109,7 +79,7 @@ void average_row(DecoderInfo* d, Resampler* r, ComponentRows components, uint32_
       add_sums(acc, r->hsum, dw, weight - 1);
     }
     if (ahead == 0 && q3 <= index) {
-      Writers<Src>::kPacked(d, acc, dw);
+      write_packed<typename Src::Colour>(d, acc, dw);
       std::memset(acc, 0, size_t(dw) * sizeof(uint32_t));
       r->current ^= 1;
       ++r->out_row;
@@ -126,7 +96,7 @@ template <class Src>
 void sample_row(DecoderInfo* d, Resampler* r, ComponentRows components, uint32_t index) {
   while (r->out_row < r->dst_height &&
          centre_point(r->out_row, r->src_height, r->dst_height) <= index) {
-    Writers<Src>::kSampled(d, components, r->dst_width);
+    write_sampled<Src>(d, components, r->dst_width);
     ++r->out_row;
   }
 }
@@ -141,13 +111,16 @@ void convert(DecoderInfo* d, uint8_t* const* const* rows, uint32_t count) {
   r->more_output = 0;
   const uint32_t top = in_region_mode(d) ? d->owner->region_top : 0;
   const bool same_size = r->src_width == r->dst_width && r->src_height == r->dst_height;
+  // A converter installed over another scheme's state finds no tables.
+  if (!same_size && (r->col_a == nullptr || (kScheme == Scheme::kAverage && r->hsum == nullptr)))
+    return;
   for (uint32_t i = 0; i < count; ++i) {
     const uint32_t row = r->src_row++;
     if (row < top || row - top >= r->src_height) continue;
     const uint8_t* components[4] = {};
     for (uint32_t c = 0; c < Src::kComponents; ++c) components[c] = rows[c][i];
     if (same_size) {
-      Writers<Src>::kOneToOne(d, components, r->dst_width);
+      write_one_to_one<Src>(d, components, r->dst_width);
     } else if constexpr (kScheme == Scheme::kCentre) {
       sample_row<Src>(d, r, components, row - top);
     } else {

@@ -76,72 +76,51 @@ inline Colour unpack_average(uint32_t v) {
 inline int32_t div255(uint32_t x) { return int32_t((x * 0x8081u) >> 23); }
 
 // ---------------------------------------------------------------------------
-// Colour sources. Row(components, first) holds the component rows of one
-// source row from its first source column; at(row, x, range_limit) gives
-// the colour of column x.
+// Colour sources. A SourceRow holds the component rows of one source row
+// from its first source column; Source::at(row, x, range_limit) gives the
+// colour of column x.
 
 using ComponentRows = const uint8_t* const*;
 
-struct YccSource {
-  using Colour = Ycc;
-  static constexpr uint32_t kComponents = 3;
-  struct Row {
-    const uint8_t* __restrict y;
-    const uint8_t* __restrict cb;
-    const uint8_t* __restrict cr;
-  };
-  static Row row(ComponentRows c, uint32_t first) {
-    return {c[0] + first, c[1] + first, c[2] + first};
-  }
-  static Ycc at(const Row& s, uint32_t x, const uint8_t*) { return {s.y[x], s.cb[x], s.cr[x]}; }
+template <uint32_t kN>
+struct SourceRow {
+  const uint8_t* __restrict c[kN];
 };
+template <class Src>
+SourceRow<Src::kComponents> source_row(ComponentRows components, uint32_t first) {
+  SourceRow<Src::kComponents> row;
+  for (uint32_t i = 0; i < Src::kComponents; ++i) row.c[i] = components[i] + first;
+  return row;
+}
+
+// YCbCr, and RGB as stored: three components taken as they are.
+template <class C>
+struct TripleSource {
+  using Colour = C;
+  static constexpr uint32_t kComponents = 3;
+  static C at(const SourceRow<3>& s, uint32_t x, const uint8_t*) {
+    return {s.c[0][x], s.c[1][x], s.c[2][x]};
+  }
+};
+using YccSource = TripleSource<Ycc>;
+using RgbSource = TripleSource<Rgb>;
 
 struct GreySource {
   using Colour = Rgb;
   static constexpr uint32_t kComponents = 1;
-  struct Row {
-    const uint8_t* __restrict g;
-  };
-  static Row row(ComponentRows c, uint32_t first) { return {c[0] + first}; }
-  static Rgb at(const Row& s, uint32_t x, const uint8_t*) {
-    const int32_t g = s.g[x];
+  static Rgb at(const SourceRow<1>& s, uint32_t x, const uint8_t*) {
+    const int32_t g = s.c[0][x];
     return {g, g, g};
   }
-};
-
-struct RgbSource {
-  using Colour = Rgb;
-  static constexpr uint32_t kComponents = 3;
-  struct Row {
-    const uint8_t* __restrict r;
-    const uint8_t* __restrict g;
-    const uint8_t* __restrict b;
-  };
-  static Row row(ComponentRows c, uint32_t first) {
-    return {c[0] + first, c[1] + first, c[2] + first};
-  }
-  static Rgb at(const Row& s, uint32_t x, const uint8_t*) { return {s.r[x], s.g[x], s.b[x]}; }
-};
-
-// Four-component rows (CMYK and YCCK).
-struct QuadRow {
-  const uint8_t* __restrict c0;
-  const uint8_t* __restrict c1;
-  const uint8_t* __restrict c2;
-  const uint8_t* __restrict k;
 };
 
 // Adobe CMYK, stored inverted: R = c * k / 255 and so on.
 struct CmykSource {
   using Colour = Rgb;
   static constexpr uint32_t kComponents = 4;
-  using Row = QuadRow;
-  static Row row(ComponentRows c, uint32_t first) {
-    return {c[0] + first, c[1] + first, c[2] + first, c[3] + first};
-  }
-  static Rgb at(const Row& s, uint32_t x, const uint8_t*) {
-    const uint32_t k = s.k[x];
-    return {div255(s.c0[x] * k), div255(s.c1[x] * k), div255(s.c2[x] * k)};
+  static Rgb at(const SourceRow<4>& s, uint32_t x, const uint8_t*) {
+    const uint32_t k = s.c[3][x];
+    return {div255(s.c[0][x] * k), div255(s.c[1][x] * k), div255(s.c[2][x] * k)};
   }
 };
 
@@ -150,12 +129,8 @@ struct CmykSource {
 struct YcckSource {
   using Colour = Rgb;
   static constexpr uint32_t kComponents = 4;
-  using Row = QuadRow;
-  static Row row(ComponentRows c, uint32_t first) {
-    return {c[0] + first, c[1] + first, c[2] + first, c[3] + first};
-  }
-  static Rgb at(const Row& s, uint32_t x, const uint8_t* range_limit) {
-    const int32_t y = s.c0[x], cb = s.c1[x], cr = s.c2[x], k = s.k[x];
+  static Rgb at(const SourceRow<4>& s, uint32_t x, const uint8_t* range_limit) {
+    const int32_t y = s.c[0][x], cb = s.c[1][x], cr = s.c[2][x], k = s.c[3][x];
     return {(k * range_limit[433 - y - ((kCrToR * cr) >> 16)]) >> 8,
             (k * range_limit[120 - y - ((kCbToG * cb + kCrToG * cr) >> 16)]) >> 8,
             (k * range_limit[481 - y - ((kCbToB * cb) >> 16)]) >> 8};
@@ -238,35 +213,17 @@ struct CountOnly {
 // Calls f(Format{}) with the format policy of an output format code.
 template <class F>
 void with_format(int32_t format, F&& f) {
+  // clang-format off
   switch (format) {
-    case 0:
-    case 9:
-    case 10:
-      f(Rgb565{});
-      break;
-    case 1:
-    case 3:
-    case 6:
-    case 11:
-      f(Rgb888{});
-      break;
-    case 2:
-      f(Planar{});
-      break;
-    case 5:
-      f(Argb{});
-      break;
-    case 7:
-    case 12:
-      f(Rgba{});
-      break;
-    case 8:
-      f(Bgra{});
-      break;
-    default:
-      f(CountOnly{});
-      break;
+    case 0: case 9: case 10:         f(Rgb565{}); break;
+    case 1: case 3: case 6: case 11: f(Rgb888{}); break;
+    case 2:                          f(Planar{}); break;
+    case 5:                          f(Argb{}); break;
+    case 7: case 12:                 f(Rgba{}); break;
+    case 8:                          f(Bgra{}); break;
+    default:                         f(CountOnly{}); break;
   }
+  // clang-format on
 }
 
 // ---------------------------------------------------------------------------
