@@ -645,8 +645,8 @@ TEST_P(RegionColumns, FusedWriterHonoursWindowEdgesAndFirstColumn) {
     ASSERT_EQ(f.select(rw, rh, rw, rh), 200);
     Canvas canvas = f.attach(format, 0, 2, 2);
     Planes luma(1, 128, 10, 3), chroma(2, 64, 5, 4);
-    vj_converter_set_row(f.d.get(), 2);
-    for (int y = 2; y < 10; y += 2)
+    vj_converter_set_row(f.d.get(), 0);
+    for (int y = 0; y < 10; y += 2)
       VETAJ_YcbcrWriteOutput1to1_YUV420(f.d.get(), luma.row(0, y), luma.row(0, y + 1),
                                         chroma.row(0, y / 2), chroma.row(1, y / 2), rw);
     EXPECT_EQ(f.d->output_rows, uint32_t(rh));

@@ -7,8 +7,9 @@
 //   output is columns [crop_x, crop_x + cropped_reduced_width) and, after
 //   crop_y rows that the row loop consumes without storing,
 //   cropped_reduced_height rows. It is resized to visible_width x
-//   visible_height output pixels. no_resize is 1 when the two sizes are
-//   equal (then every source row and column maps to one output pixel).
+//   visible_height output pixels. When the two sizes are equal (no_resize)
+//   every source row and column maps to one output pixel; the converters
+//   compare the sizes themselves.
 // - output_ptr addresses the output pixel of the first source-order row and
 //   first source-order column; consecutive pixels of a row are pixel_step
 //   pixels apart and consecutive rows row_step bytes apart (rotation is
@@ -45,8 +46,9 @@
 // own buffer. Source rows are numbered in the reduced image: the resampler's
 // source-row counter (Resampler::src_row) holds the number of the next row
 // handed to a converter or the first luma row of the next fused call. The
-// row driver sets it with vj_converter_set_row when it starts below row 0
-// or skips rows; converters and fused writers advance it themselves. Rows
+// row driver sets it with vj_converter_set_row when the first row it hands
+// over is not row 0 or when it skips rows; converters and fused writers
+// advance it by the rows they receive. Rows
 // outside [region_top, region_top + cropped_reduced_height) are consumed
 // without output; a two-row fused call writes only its rows inside
 // [region_top, region_top + region_height).
@@ -69,22 +71,22 @@ struct Resampler {
   uint32_t more_output;  // set by the row driver before converting; the
                          // converters produce every row a batch completes
                          // and always clear it
-  uint32_t current;      // accumulator row (0 or 1) that holds out_row
   uint32_t* col_a;       // per output column: source column (centre
                          // sampling) or the 1/4-point column (averaging)
   uint32_t* col_b;       // averaging: the 3/4-point column
-  uint32_t* acc[2];      // accumulator rows of packed sums (averaging)
+  uint32_t* acc;         // averaging: packed sums of output row out_row
   uint32_t* hsum;        // packed two-column sums of the current source row
 };
 
 // Chooses the row converter for the decoder's colour space, output size and
 // decode mode, and prepares the resampling state (resize tables,
-// accumulators). Returns 200, or 201 for an unsupported colour space or when
-// memory runs out.
+// accumulators). Returns 200, or 201 for an unsupported colour space, a
+// source window outside the reduced picture, an empty or oversized size, or
+// when memory runs out. The decoder's ColourConverter must be allocated.
 int32_t vj_select_converter(DecoderInfo* decoder);
 // Sets the number of the next source row (see "Region mode" above).
 void vj_converter_set_row(DecoderInfo* decoder, uint32_t row);
-// Releases the resampling state.
+// Releases the resampling state (VETAJ_DeleteDecoderInfo must call it).
 void vj_release_converter(DecoderInfo* decoder);
 // The fused writer for a chroma layout (fused code 1: 4:2:0, 2: 4:2:2
 // horizontal, 3: 4:2:2 vertical, 4: 4:4:4) and output format.

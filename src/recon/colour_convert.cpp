@@ -56,36 +56,29 @@ inline void add_sums(uint32_t* __restrict acc, const uint32_t* __restrict sums, 
   for (uint32_t k = 0; k < n; ++k) acc[k] += sums[k] << shift;
 }
 
-// Quarter-point averaging, down: source row `index` of the window goes into
-// the output rows whose quarter points it holds (at most the current and
-// the next one while reducing). Every output row whose 3/4 point has been
-// reached is written, so one source row may complete several output rows
-// when enlarging.
+// Quarter-point averaging: source row `index` of the window is added to the
+// output rows whose quarter points it holds, and every output row whose 3/4
+// point it reaches is written. The 3/4 point of an output row never lies
+// below the 1/4 point of the next one, so one accumulator row suffices; one
+// source row may complete several output rows when enlarging.
 template <class Src>
 void average_row(DecoderInfo* d, Resampler* r, ComponentRows components, uint32_t index) {
   const uint32_t sh = r->src_height, dh = r->dst_height, dw = r->dst_width;
   bool summed = false;
-  uint32_t ahead = 0;  // 0: the current output row, 1: the next
-  while (ahead < 2 && r->out_row + ahead < dh) {
-    const uint32_t j = r->out_row + ahead;
-    const uint32_t q1 = quarter_point(j, sh, dh);
+  while (r->out_row < dh) {
+    const uint32_t q1 = quarter_point(r->out_row, sh, dh);
     if (q1 > index) break;
-    const uint32_t q3 = three_quarter_point(j, sh, dh);
-    uint32_t* acc = r->acc[(r->current + ahead) & 1];
+    const uint32_t q3 = three_quarter_point(r->out_row, sh, dh);
     const uint32_t weight = uint32_t(q1 == index) + uint32_t(q3 == index);
     if (weight != 0) {
       if (!summed) horizontal_sums<Src>(d, r, components);
       summed = true;
-      add_sums(acc, r->hsum, dw, weight - 1);
+      add_sums(r->acc, r->hsum, dw, weight - 1);
     }
-    if (ahead == 0 && q3 <= index) {
-      write_packed<typename Src::Colour>(d, acc, dw);
-      std::memset(acc, 0, size_t(dw) * sizeof(uint32_t));
-      r->current ^= 1;
-      ++r->out_row;
-      continue;  // the next output row becomes the current one
-    }
-    ++ahead;
+    if (q3 > index) break;
+    write_packed<typename Src::Colour>(d, r->acc, dw);
+    std::memset(r->acc, 0, size_t(dw) * sizeof(uint32_t));
+    ++r->out_row;
   }
 }
 
@@ -129,7 +122,7 @@ void convert(DecoderInfo* d, uint8_t* const* const* rows, uint32_t count) {
   }
 }
 
-// Column tables of the chosen scheme and the accumulator rows.
+// Column tables of the chosen scheme and the accumulator row.
 bool build_tables(Resampler* r, Scheme scheme) {
   const uint32_t sw = r->src_width, dw = r->dst_width;
   r->col_a = vj::fake_alloc_zeroed<uint32_t>(dw);
@@ -139,10 +132,9 @@ bool build_tables(Resampler* r, Scheme scheme) {
     return true;
   }
   r->col_b = vj::fake_alloc_zeroed<uint32_t>(dw);
-  r->acc[0] = vj::fake_alloc_zeroed<uint32_t>(dw);
-  r->acc[1] = vj::fake_alloc_zeroed<uint32_t>(dw);
+  r->acc = vj::fake_alloc_zeroed<uint32_t>(dw);
   r->hsum = vj::fake_alloc_zeroed<uint32_t>(dw);
-  if (r->col_b == nullptr || r->acc[0] == nullptr || r->acc[1] == nullptr || r->hsum == nullptr)
+  if (r->col_b == nullptr || r->acc == nullptr || r->hsum == nullptr)
     return false;
   for (uint32_t k = 0; k < dw; ++k) {
     r->col_a[k] = quarter_point(k, sw, dw);
@@ -265,8 +257,7 @@ void vj_release_converter(DecoderInfo* d) {
   Resampler* r = d->resampler;
   vj::fake_free(r->col_a);
   vj::fake_free(r->col_b);
-  vj::fake_free(r->acc[0]);
-  vj::fake_free(r->acc[1]);
+  vj::fake_free(r->acc);
   vj::fake_free(r->hsum);
   vj::os_free(d->resampler);
 }
