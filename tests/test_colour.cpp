@@ -50,27 +50,10 @@ Px ref_ycck(int y, int cb, int cr, int k) {
           k * clamp255(481 - y - floor_div(116130LL * cb, 65536)) / 256};
 }
 
+// Bytes per pixel by format code (planar counts its luma byte).
 int bytes_of(int format) {
-  switch (format) {
-    case 0:
-    case 9:
-    case 10:
-      return 2;
-    case 1:
-    case 3:
-    case 6:
-    case 11:
-      return 3;
-    case 5:
-    case 7:
-    case 8:
-    case 12:
-      return 4;
-    case 2:
-      return 1;
-    default:
-      return 0;
-  }
+  static const int kBytes[13] = {2, 3, 1, 3, 0, 4, 3, 4, 4, 2, 2, 3, 4};
+  return format >= 0 && format < 13 ? kBytes[format] : 0;
 }
 void encode(int format, const std::array<int, 3>& c, uint8_t* p) {
   const int r = c[0], g = c[1], b = c[2];
