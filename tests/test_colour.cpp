@@ -257,14 +257,10 @@ Px source_colour(int space, const Planes& s, int x, int y) {
   }));
 }
 
-// Hands rows first..end-1 of the planes to the converter in batches of
-// cycling sizes.
-void feed(Fixture& f, Planes& s, int first = 0, int end = -1) {
-  if (end < 0) end = s.h;
-  static const int kBatches[] = {1, 2, 3};
-  int turn = 0;
-  for (int y = first; y < end;) {
-    const int n = std::min(kBatches[turn++ % 3], end - y);
+// Hands every row of the planes to the converter, in batches of 1, 2, 3, ...
+void feed(Fixture& f, Planes& s) {
+  for (int y = 0, turn = 0; y < s.h; ++turn) {
+    const int n = std::min(turn % 3 + 1, s.h - y);
     std::vector<uint8_t*> rows[4];
     uint8_t* const* sets[4] = {};
     for (size_t c = 0; c < s.p.size(); ++c) {

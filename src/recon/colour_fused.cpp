@@ -16,32 +16,39 @@ void fused_span(const Sink* sinks, const uint8_t* const* luma, const uint8_t* __
                 const uint8_t* __restrict cr, uint32_t first, uint32_t n,
                 const uint8_t* range_limit) {
   if constexpr (Sink::kPacked) {
-    const Sink s0 = sinks[0];
-    const Sink s1 = sinks[kCount - 1];
-    const uint8_t* __restrict y0 = luma[0];
-    const uint8_t* __restrict y1 = luma[kCount - 1];
     const uint8_t* __restrict rl = range_limit;
-    auto pixel = [&](uint32_t i, uint32_t x, const ChromaDiff& c) {
-      const int32_t a = y0[x];
-      s0.put_rgb(i, rl[a + c.rd], rl[a + c.gd], rl[a + c.bd]);
-      if constexpr (kCount == 2) {
-        const int32_t b = y1[x];
-        s1.put_rgb(i, rl[b + c.rd], rl[b + c.gd], rl[b + c.bd]);
-      }
-    };
     uint32_t i = 0;
     uint32_t x = first;
+    auto pixel = [rl](const Sink& s0, const Sink& s1, uint32_t k, int32_t a, int32_t b,
+                      const ChromaDiff& c) {
+      s0.put_rgb(k, rl[a + c.rd], rl[a + c.gd], rl[a + c.bd]);
+      if constexpr (kCount == 2) s1.put_rgb(k, rl[b + c.rd], rl[b + c.gd], rl[b + c.bd]);
+    };
     if (kH == 2 && (x & 1) != 0 && n > 0) {
-      pixel(0, x, chroma_diff(cb[x / kH], cr[x / kH]));
+      const ChromaDiff c = chroma_diff(cb[x / 2], cr[x / 2]);
+      pixel(sinks[0], sinks[kCount - 1], 0, luma[0][x], luma[kCount - 1][x], c);
       i = 1;
       ++x;
     }
-    for (; i + kH <= n; i += kH, x += kH) {
-      const ChromaDiff c = chroma_diff(cb[x / kH], cr[x / kH]);
-      pixel(i, x, c);
-      if constexpr (kH == 2) pixel(i + 1, x + 1, c);
+    // From here on pixel k of the span uses luma k and chroma k / kH.
+    const Sink s0 = sinks[0].from(i);
+    const Sink s1 = sinks[kCount - 1].from(i);
+    const uint8_t* __restrict y0 = luma[0] + x;
+    const uint8_t* __restrict y1 = luma[kCount - 1] + x;
+    const uint8_t* __restrict pb = cb + x / kH;
+    const uint8_t* __restrict pr = cr + x / kH;
+    const uint32_t span = n - i;
+    const uint32_t groups = span / kH;
+    for (uint32_t m = 0; m < groups; ++m) {
+      const ChromaDiff c = chroma_diff(pb[m], pr[m]);
+      const uint32_t k = m * kH;
+      pixel(s0, s1, k, y0[k], kCount == 2 ? y1[k] : 0, c);
+      if constexpr (kH == 2) pixel(s0, s1, k + 1, y0[k + 1], kCount == 2 ? y1[k + 1] : 0, c);
     }
-    if (i < n) pixel(i, x, chroma_diff(cb[x / kH], cr[x / kH]));
+    if (groups * kH < span) {
+      const uint32_t k = groups * kH;
+      pixel(s0, s1, k, y0[k], kCount == 2 ? y1[k] : 0, chroma_diff(pb[groups], pr[groups]));
+    }
   } else {
     // Planar: luma copied, chroma as stored; the sink picks the pixels
     // that carry chroma.

@@ -34,14 +34,33 @@ constexpr int32_t kCrToG = -46802;
 constexpr int32_t kCbToB = 116130;
 
 // Colour differences of one chroma sample pair, shared by every luma sample
-// that uses the pair (arithmetic shifts, no rounding constant).
+// that uses the pair: rd = (91881 * cr) >> 16, gd = (-22554 * cb - 46802 *
+// cr) >> 16, bd = (116130 * cb) >> 16 with cb, cr re-centred on 0 (arithmetic
+// shifts, no rounding constant). The products come from tables built at
+// compile time, so a pair costs four loads.
 struct ChromaDiff {
   int32_t rd, gd, bd;
 };
+struct ChromaTables {
+  int32_t rd[256];    // by Cr
+  int32_t bd[256];    // by Cb
+  int32_t g_cb[256];  // -22554 * cb, before the shift
+  int32_t g_cr[256];  // -46802 * cr, before the shift
+};
+constexpr ChromaTables make_chroma_tables() {
+  ChromaTables t{};
+  for (int32_t v = 0; v < 256; ++v) {
+    t.rd[v] = (kCrToR * (v - 128)) >> 16;
+    t.bd[v] = (kCbToB * (v - 128)) >> 16;
+    t.g_cb[v] = kCbToG * (v - 128);
+    t.g_cr[v] = kCrToG * (v - 128);
+  }
+  return t;
+}
+inline constexpr ChromaTables kChroma = make_chroma_tables();
+
 inline ChromaDiff chroma_diff(int32_t cb, int32_t cr) {
-  cb -= 128;
-  cr -= 128;
-  return {(kCrToR * cr) >> 16, (kCbToG * cb + kCrToG * cr) >> 16, (kCbToB * cb) >> 16};
+  return {kChroma.rd[cr], (kChroma.g_cb[cb] + kChroma.g_cr[cr]) >> 16, kChroma.bd[cb]};
 }
 
 // range_limit addresses the identity part of the clamping table.
@@ -246,6 +265,8 @@ struct PackedSink {
     if constexpr (kUnit) return row + size_t(i) * Format::kBytes;
     return row + ptrdiff_t(i) * step;
   }
+  // The same row from pixel i on.
+  PackedSink from(uint32_t i) const { return {at(i), step, range_limit}; }
   void put_rgb(uint32_t i, int32_t r, int32_t g, int32_t b) const { Format::store(at(i), r, g, b); }
   template <class Colour>
   void put(uint32_t i, Colour c) const {
