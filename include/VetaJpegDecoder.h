@@ -82,15 +82,20 @@ extern "C" {
 
 /*
  * Output formats (DecInfo.output_format). All multi-byte values are stored
- * little-endian; alpha is always 255.
- *   0  RGB565: one 16-bit word, red in bits 15-11, green 10-5, blue 4-0.
+ * little-endian; alpha is always 255. Every colour space (grey, RGB, YCbCr,
+ * CMYK, YCCK) is written in every format, and every format honours the
+ * output rotation.
+ *   0  RGB565: one 16-bit word, red in bits 15-11, green 10-5, blue 4-0
+ *      (each channel truncated).
  *   1  three bytes per pixel: R, G, B.
  *   2  planar YUV 4:2:0: a full-size Y plane (row length = output width),
  *      then a U (Cb) plane and a V (Cr) plane of ((width+1)/2) x
- *      ((height+1)/2) bytes each; chroma from the first pixel of each pair
- *      on even rows.
- *   3  three bytes per pixel (no writer produces it; rows are only counted).
- *   4  accepted, not written.
+ *      ((height+1)/2) bytes each. Chroma is taken from the pixel at even
+ *      coordinates of each 2 x 2 group (no averaging). YCbCr pictures keep
+ *      their samples; RGB, CMYK and YCCK pictures are converted back from
+ *      RGB; grey pictures have chroma 128.
+ *   3  three bytes per pixel: R, G, B (as 1).
+ *   4  accepted, not written (rows are only counted).
  *   5  four bytes per pixel: A, R, G, B.
  *   6  three bytes per pixel: R, G, B (as 1).
  *   7  RGBA8888: R, G, B, A.
