@@ -106,6 +106,64 @@ TEST_P(BaselineYcc, FullSizeMatchesLibjpeg) {
 INSTANTIATE_TEST_SUITE_P(Corpus, BaselineYcc, ::testing::ValuesIn(baseline_ycc_fixtures()),
                          param_name);
 
+std::vector<std::string> other_colour_fixtures() {
+  std::vector<std::string> out;
+  for (const auto& n : vjtest::list_fixtures(".jpg")) {
+    vjtest::OracleHeader h;
+    if (!vjtest::oracle_header(vjtest::read_fixture(n), &h) || h.progressive) continue;
+    if (n.rfind("bad_", 0) == 0 || h.jpeg_color_space == 3) continue;
+    out.push_back(n);
+  }
+  return out;
+}
+
+class BaselineOther : public ::testing::TestWithParam<std::string> {};
+
+// Grey, RGB, CMYK and YCCK: RGBA equals the colour formulas applied to
+// libjpeg-turbo's raw planes.
+TEST_P(BaselineOther, FullSizeMatchesLibjpeg) {
+  const auto jpeg = vjtest::read_fixture(GetParam());
+  vjtest::OracleHeader h;
+  ASSERT_TRUE(vjtest::oracle_header(jpeg, &h));
+  vjtest::OraclePlanes p;
+  ASSERT_TRUE(vjtest::oracle_planes(jpeg, 1, &p));
+  const int w = h.width, hh = h.height;
+  const auto rgba = decode(jpeg, KOLVAVETA_FMT_RGBA8888, w, hh);
+  ASSERT_EQ(rgba.ok, 1) << rgba.err;
+  for (int y = 0; y < hh; ++y) {
+    for (int x = 0; x < w; ++x) {
+      int rgb[3];
+      switch (h.jpeg_color_space) {
+        case 1:  // grey
+          rgb[0] = rgb[1] = rgb[2] = p.at(x, y, 0);
+          break;
+        case 2:  // RGB
+          for (int c = 0; c < 3; ++c) rgb[c] = p.at(x, y, c);
+          break;
+        case 4: {  // CMYK (Adobe, inverted)
+          const int k = p.at(x, y, 3);
+          for (int c = 0; c < 3; ++c) rgb[c] = p.at(x, y, c) * k / 255;
+          break;
+        }
+        default: {  // YCCK
+          const int Y = p.at(x, y, 0), cb = p.at(x, y, 1), cr = p.at(x, y, 2), k = p.at(x, y, 3);
+          rgb[0] = (k * clamp255(433 - Y - ((91881 * cr) >> 16))) >> 8;
+          rgb[1] = (k * clamp255(120 - Y - ((-22554 * cb - 46802 * cr) >> 16))) >> 8;
+          rgb[2] = (k * clamp255(481 - Y - ((116130 * cb) >> 16))) >> 8;
+          break;
+        }
+      }
+      const uint8_t* px = &rgba.buf[(size_t(y) * w + x) * 4];
+      ASSERT_EQ(px[0], rgb[0]) << GetParam() << " " << x << "," << y;
+      ASSERT_EQ(px[1], rgb[1]) << x << "," << y;
+      ASSERT_EQ(px[2], rgb[2]) << x << "," << y;
+    }
+  }
+}
+
+INSTANTIATE_TEST_SUITE_P(Corpus, BaselineOther, ::testing::ValuesIn(other_colour_fixtures()),
+                         param_name);
+
 TEST(Decode, SampleLumaMatchesLibjpeg) {
   const auto jpeg = vjtest::read_fixture("sample.jpg");
   vjtest::OracleHeader h;
