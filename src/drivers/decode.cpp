@@ -3,6 +3,7 @@
 
 #include <cstring>
 
+#include "drivers/scaled.h"
 #include "entropy/mcu.h"
 #include "meta/exif.h"
 #include "recon/colour.h"
@@ -26,30 +27,6 @@ uint32_t rows_consumed(const DecoderInfo* d) {
   return d->reduced_height - d->upsampler->rows_to_go;
 }
 
-// Transforms the blocks of one decoded MCU into the sample rows.
-void transform_mcu(DecoderInfo* d, uint8_t*** rows, uint32_t mcu_col, uint32_t mcu_row_in_imcu) {
-  const bool single = d->comps_in_scan == 1;
-  uint32_t b = 0;
-  for (uint32_t p = 0; p < d->comps_in_scan; ++p) {
-    const ComponentInfo* c = d->scan_components[p];
-    const uint32_t mw = single ? 1 : c->mcu_width;
-    const uint32_t mh = single ? 1 : c->mcu_height;
-    const uint8_t* range =
-        vj_range_limit_centre(c->index == 0 ? d->range_limit : d->range_limit_chroma);
-    for (uint32_t by = 0; by < mh; ++by) {
-      const uint32_t block_row_in_imcu = single ? mcu_row_in_imcu : by;
-      const uint32_t block_row = d->imcu_row * c->v_samp + block_row_in_imcu;
-      for (uint32_t bx = 0; bx < mw; ++bx, ++b) {
-        if (block_row >= c->height_blocks) continue;  // below the picture
-        const int32_t last = d->last_nonzero[b];
-        const VETAJ_IdctFn idct = d->idct_slots[last > 28 ? 28 : (last < 0 ? 0 : last)];
-        idct(range, c->multipliers, d->imcu.blocks[b], rows[c->index] + block_row_in_imcu * 8,
-             (mcu_col * mw + bx) * 8);
-      }
-    }
-  }
-}
-
 }  // namespace
 
 void vj_release_decoder(DecoderInfo*& d) {
@@ -59,64 +36,25 @@ void vj_release_decoder(DecoderInfo*& d) {
   d = nullptr;
 }
 
-int32_t VETAJ_DecodeSingleiMcu(DecoderInfo* d, uint8_t*** rows) {
-  const DecInfo* o = d->owner;
-  const bool region = o != nullptr && o->region_mode != 0;
-  if (region && d->cropped_reduced_height > 0) {
-    const uint64_t seen = uint64_t(d->visible_height) * rows_consumed(d) /
-                          static_cast<uint32_t>(d->cropped_reduced_height);
-    if (seen > uint64_t(o->region_top) + o->region_height) return vj::kStatusEnd;
-  }
-  const uint32_t mcu_px = d->mcu_height_px != 0 ? d->mcu_height_px : 8;
-  McuDecodeFn decode = d->decode_mcu;
-  bool skipping = false;
-  if (region && d->imcu_row < o->region_top / mcu_px) skipping = true;
-  const bool single = d->comps_in_scan == 1;
-  const uint32_t block_px = single ? mcu_px / d->scan_components[0]->v_samp : mcu_px;
-  const uint32_t nb = d->blocks_in_mcu;
-  int16_t** blocks = d->imcu.blocks;
-  for (uint32_t mr = d->imcu.mcu_row; mr < d->imcu.mcu_rows; ++mr) {
-    const uint32_t scan_row = single ? d->imcu_row * d->scan_components[0]->v_samp + mr : d->imcu_row;
-    const uint32_t top = d->imcu_row * mcu_px + mr * (single ? block_px : 0);
-    for (uint32_t col = d->imcu.first_col; col < d->mcus_per_row; ++col) {
-      d->current_mcu_row = scan_row;
-      d->current_mcu_col = col;
-      std::memset(d->coef_area, 0, nb * 64 * sizeof(int16_t));
-      const int32_t ok = skipping ? VETAJ_SkipMcu(d) : decode(d, blocks);
-      if (ok == 0) {
-        ++d->error_count;
-        if (d->image_height > top && d->image_height - top > 15) {
-          d->imcu.mcu_row = mr;
-          d->imcu.first_col = col;
-          return vj::kStatusCorrupt;
-        }
-        // Damage in the last rows of the picture is concealed: flat blocks.
-        std::memset(d->coef_area, 0, nb * 64 * sizeof(int16_t));
-        for (uint32_t b = 0; b < nb; ++b) d->last_nonzero[b] = 0;
-      }
-      if (!skipping) transform_mcu(d, rows, col, mr);
-    }
-    d->imcu.first_col = 0;
-  }
-  ++d->imcu_row;
-  if (d->imcu_row >= d->total_imcu_rows) return vj::kStatusEnd;
-  VETAJ_SetupiMcu(d);
-  return vj::kStatusNextRow;
-}
-
 int32_t VETAJ_ProcessData(DecoderInfo* d, uint8_t* output, uint32_t* row_ctr,
                           uint32_t rows_avail) {
   RowController& ctl = d->controller;
   int32_t status = 0;
   if (ctl.buffer_full == 0) {
+    if (ctl.finished != 0) return vj::kStatusEnd;
     if (d->check_callback != nullptr &&
         d->check_callback(d->owner, static_cast<int32_t>(rows_consumed(d))) == 0)
       return vj::kStatusFail;
     uint8_t** lists[4];
     for (uint32_t ci = 0; ci < d->num_components; ++ci)
       lists[ci] = d->sample_lists[ci][ctl.which_set];
-    status = VETAJ_DecodeSingleiMcu(d, lists);
-    if (status == vj::kStatusCorrupt) return vj::kStatusFail;
+    status = d->imcu.decode_row(d, lists);
+    if (status == vj::kStatusCorrupt || status == vj::kStatusFail) return vj::kStatusFail;
+    // The rows of the last iMCU row are still to be delivered.
+    if (status == vj::kStatusEnd) {
+      ctl.finished = 1;
+      status = 0;
+    }
     ctl.buffer_full = 1;
     ++ctl.imcu_rows_done;
   }
@@ -164,6 +102,47 @@ int32_t VETAJ_Decode_Dualcore_1to1(DecInfo* o, OutputRequest* /*request*/, Decod
   return status;
 }
 
+namespace {
+
+using RowStep = int32_t (*)(DecoderInfo*, uint8_t*, uint32_t*, uint32_t);
+
+// Consumes the rows above the crop window: decoded, not stored.
+int32_t skip_crop_rows(DecInfo* o, DecoderInfo* d, RowStep step) {
+  const int32_t row_step = d->row_step;
+  d->row_step = 0;
+  d->skip_output = 1;
+  int32_t status = 0;
+  while (rows_consumed(d) < static_cast<uint32_t>(d->crop_y)) {
+    if (o->cancel != 0) {
+      status = vj::kStatusCancelled;
+      break;
+    }
+    uint32_t rows = 0;
+    status = step(d, nullptr, &rows, 1);
+    if (status == vj::kStatusFail) break;
+  }
+  d->skip_output = 0;
+  d->row_step = row_step;
+  return status;
+}
+
+// Rows until the cropped picture is complete.
+int32_t run_rows(DecInfo* o, DecoderInfo* d, RowStep step) {
+  const uint32_t end = static_cast<uint32_t>(d->crop_y + d->cropped_reduced_height);
+  uint32_t counter = rows_consumed(d);
+  int32_t status = 0;
+  while (counter < end) {
+    if (o->cancel != 0) return vj::kStatusCancelled;
+    uint32_t rows = 0;
+    status = step(d, nullptr, &rows, 1);
+    counter += rows;
+    if (status == vj::kStatusFail || status == vj::kStatusEnd) break;
+  }
+  return status;
+}
+
+}  // namespace
+
 int32_t VETAJ_DecodeImage(DecInfo* o, StreamWindow* w, OutputRequest* req) {
   DecoderInfo* d = VETAJ_Initialize(o, w, req);
   if (d == nullptr) {
@@ -172,26 +151,23 @@ int32_t VETAJ_DecodeImage(DecInfo* o, StreamWindow* w, OutputRequest* req) {
   }
   auto release = vj::on_exit([&] { vj_release_decoder(d); });
   if (d->output_width == 0 || d->output_height == 0) return vj::kStatusOk;
-  if (d->marker->frame_kind != kFrameBaseline || d->scale_shift != 0 || d->comps_in_scan == 0 ||
+  if (d->marker->frame_kind != kFrameBaseline || d->comps_in_scan == 0 ||
       (d->comps_in_scan != d->num_components && d->num_components > 1)) {
-    // Reduced, progressive and multi-scan frames need drivers that this
-    // build does not have yet.
+    // Progressive and multi-scan frames need drivers that this build does
+    // not have yet.
     vj::set_error(KOLVAVETA_ERR_SETUP);
     return vj::kStatusFail;
   }
-  // Rows above the crop window are decoded but not stored.
-  int32_t status = 0;
-  const int32_t row_step = d->row_step;
-  d->row_step = 0;
-  const uint32_t crop = static_cast<uint32_t>(d->crop_y);
-  while (rows_consumed(d) < crop) {
-    if (o->cancel != 0) return vj::kStatusCancelled;
-    uint32_t rows = 0;
-    status = VETAJ_ProcessData(d, nullptr, &rows, 1);
-    if (status == vj::kStatusFail) return vj::kStatusFail;
+  int32_t status;
+  if (d->scale_shift == 0) {
+    status = skip_crop_rows(o, d, VETAJ_ProcessData);
+    if (status == vj::kStatusFail || status == vj::kStatusCancelled) return status;
+    status = VETAJ_Decode_Dualcore_1to1(o, req, d, d->reduced_height);
+  } else {
+    status = skip_crop_rows(o, d, VETAJ_ProcessData_resize);
+    if (status == vj::kStatusFail || status == vj::kStatusCancelled) return status;
+    status = run_rows(o, d, VETAJ_ProcessData_resize);
   }
-  d->row_step = row_step;
-  status = VETAJ_Decode_Dualcore_1to1(o, req, d, d->reduced_height);
   if (status == vj::kStatusCancelled) return status;
   return status == vj::kStatusFail ? vj::kStatusFail : vj::kStatusOk;
 }

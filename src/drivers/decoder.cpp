@@ -53,6 +53,7 @@ void VETAJ_DeleteDecoderInfo(DecoderInfo* d) {
   d->range_limit = d->range_limit_chroma = nullptr;
   vj::fake_free(d->coef_area);
   vj::fake_free(d->prog_workspace);
+  vj::os_free(d->dc_sums);
 }
 
 void vj_setup_component_geometry(DecoderInfo* d) {

@@ -58,6 +58,7 @@ struct RowController {
   uint32_t imcu_rows_done;   // iMCU rows decoded so far
   uint32_t group_counter;    // row group counter
   uint32_t context_state;    // 0 prepare, 1 process, 2 postponed
+  uint32_t finished;         // the last iMCU row has been decoded
 };
 
 struct DecoderInfo {
@@ -193,6 +194,7 @@ struct DecoderInfo {
   uint32_t total_imcu_rows;
   uint32_t skip_output;            // rows are consumed without being written
   uint32_t progress_row;           // row counter of the progress checkpoints
+  int32_t* dc_sums;                // DC sums of the averaging drivers beyond 1/8
 };
 
 // Releases everything the decoder owns (not the DecoderInfo itself).

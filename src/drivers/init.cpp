@@ -7,6 +7,7 @@
 #include "recon/colour.h"
 #include "recon/idct.h"
 #include "recon/upsample.h"
+#include "drivers/scaled.h"
 #include "entropy/mcu.h"
 #include "syntax/scan_setup.h"
 
@@ -570,7 +571,7 @@ int32_t VETAJ_InitDecBeforeScan(DecoderInfo* d) {
   // Row functions: the full-size baseline path (reduced and progressive
   // paths install theirs in their own drivers).
   d->decode_mcu = VETAJ_DecodeMcu;
-  d->imcu.decode_row = nullptr;
+  vj_install_row_functions(d);
   d->progress_row = 0;
   VETAJ_SetupiMcu(d);
   return vj::kStatusOk;

@@ -5,6 +5,7 @@
 
 #include <csetjmp>
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 
 #include <jpeglib.h>
@@ -34,7 +35,7 @@ size_t stream_start(const std::vector<uint8_t>& bytes) {
   return 0;
 }
 
-enum class Job { kHeader, kCoefficients, kPlanes };
+enum class Job { kHeader, kCoefficients, kPlanes, kTruncate };
 
 struct Request {
   Job job;
@@ -43,6 +44,8 @@ struct Request {
   OracleHeader* header = nullptr;
   std::vector<OracleComponent>* components = nullptr;
   OraclePlanes* planes = nullptr;
+  int keep = 63;                              // kTruncate: last zig-zag index kept
+  std::vector<uint8_t>* transcoded = nullptr; // kTruncate: the rewritten stream
 };
 
 // The step functions below run between setjmp and a possible longjmp: they
@@ -119,7 +122,48 @@ void read_planes(jpeg_decompress_struct* d, int scale_denom, int out_color_space
   jpeg_finish_decompress(d);
 }
 
+// Zig-zag index -> natural position, built from the scan pattern.
+void zigzag_order(int order[64]) {
+  int k = 0;
+  for (int s = 0; s < 15; ++s) {
+    for (int i = 0; i <= s; ++i) {
+      const int row = (s % 2 == 0) ? s - i : i;
+      const int col = s - row;
+      if (row < 8 && col < 8) order[k++] = row * 8 + col;
+    }
+  }
+}
+
+// Zeroes every coefficient past zig-zag index `keep` and writes the
+// coefficients back as a sequential stream.
+void truncate_coefficients(jpeg_decompress_struct* d, jpeg_compress_struct* c, int keep,
+                           unsigned char** mem, unsigned long* size) {
+  int order[64];
+  zigzag_order(order);
+  jvirt_barray_ptr* arrays = jpeg_read_coefficients(d);
+  for (int ci = 0; ci < d->num_components; ++ci) {
+    const jpeg_component_info& comp = d->comp_info[ci];
+    const int rows = round_up(static_cast<int>(comp.height_in_blocks), comp.v_samp_factor);
+    const int cols = round_up(static_cast<int>(comp.width_in_blocks), comp.h_samp_factor);
+    for (int row = 0; row < rows; ++row) {
+      JBLOCKARRAY blocks = d->mem->access_virt_barray(reinterpret_cast<j_common_ptr>(d), arrays[ci],
+                                                      static_cast<JDIMENSION>(row), 1, TRUE);
+      for (int col = 0; col < cols; ++col)
+        for (int k = keep + 1; k < 64; ++k) blocks[0][col][order[k]] = 0;
+    }
+  }
+  jpeg_create_compress(c);
+  jpeg_copy_critical_parameters(d, c);
+  jpeg_mem_dest(c, mem, size);
+  jpeg_write_coefficients(c, arrays);
+  jpeg_finish_compress(c);
+}
+
 bool run(const std::vector<uint8_t>& jpeg, const Request& req) {
+  jpeg_compress_struct c;
+  std::memset(&c, 0, sizeof c);
+  unsigned char* mem = nullptr;
+  unsigned long mem_size = 0;
   jpeg_decompress_struct d;
   ErrorManager err;
   std::memset(&d, 0, sizeof d);
@@ -127,8 +171,11 @@ bool run(const std::vector<uint8_t>& jpeg, const Request& req) {
   err.pub.error_exit = error_exit;
   err.pub.emit_message = emit_message;
   err.pub.output_message = output_message;
+  c.err = &err.pub;
   if (setjmp(err.jump) != 0) {
     jpeg_destroy_decompress(&d);
+    jpeg_destroy_compress(&c);
+    std::free(mem);
     return false;
   }
   jpeg_create_decompress(&d);
@@ -145,8 +192,14 @@ bool run(const std::vector<uint8_t>& jpeg, const Request& req) {
     case Job::kPlanes:
       read_planes(&d, req.scale_denom, req.out_color_space, req.planes);
       break;
+    case Job::kTruncate:
+      truncate_coefficients(&d, &c, req.keep, &mem, &mem_size);
+      req.transcoded->assign(mem, mem + mem_size);
+      break;
   }
   jpeg_destroy_decompress(&d);
+  jpeg_destroy_compress(&c);
+  std::free(mem);
   return true;
 }
 
@@ -174,6 +227,16 @@ bool oracle_planes_as(const std::vector<uint8_t>& jpeg, int scale_denom, int out
   req.out_color_space = out_color_space;
   req.planes = out;
   return run(jpeg, req);
+}
+
+bool oracle_truncated_planes(const std::vector<uint8_t>& jpeg, int keep, int scale_denom,
+                             OraclePlanes* out) {
+  std::vector<uint8_t> transcoded;
+  Request req{Job::kTruncate};
+  req.keep = keep;
+  req.transcoded = &transcoded;
+  if (!run(jpeg, req)) return false;
+  return oracle_planes(transcoded, scale_denom, out);
 }
 
 }  // namespace vjtest

@@ -55,6 +55,11 @@ bool oracle_planes(const std::vector<uint8_t>& jpeg, int scale_denom, OraclePlan
 // As oracle_planes but converting to the given libjpeg colour space (e.g. JCS_RGB).
 bool oracle_planes_as(const std::vector<uint8_t>& jpeg, int scale_denom, int out_color_space, OraclePlanes* out);
 
+// Decodes the stream after zeroing every coefficient past zig-zag index
+// `keep` (the coefficients are rewritten losslessly as a sequential stream
+// first), as oracle_planes does.
+bool oracle_truncated_planes(const std::vector<uint8_t>& jpeg, int keep, int scale_denom,
+                             OraclePlanes* out);
 }  // namespace vjtest
 
 #endif  // VETAJ_HAVE_LIBJPEG

@@ -1,0 +1,382 @@
+// iMCU-row drivers of full-size and reduced output, the DC-only drivers
+// beyond 1/8, and the row controller of reduced output.
+#include "drivers/scaled.h"
+
+#include <cstring>
+
+#include "drivers/init.h"
+#include "entropy/mcu.h"
+#include "recon/idct.h"
+#include "recon/upsample.h"
+#include "syntax/scan_setup.h"
+
+namespace {
+
+// Rows of the decoded (reduced) picture handed to the converters so far.
+uint32_t rows_consumed(const DecoderInfo* d) {
+  return d->reduced_height - d->upsampler->rows_to_go;
+}
+
+// Transform slot of the installed table.
+VETAJ_IdctFn installed_slot(DecoderInfo* d, int32_t index) { return d->idct_slots[index]; }
+int32_t full_index(int32_t last) { return last > 28 ? 28 : (last < 0 ? 0 : last); }
+
+// Top image row of the current MCU row and the block rows per MCU row.
+struct McuRowGeometry {
+  uint32_t mcu_px;    // MCU height in image pixels
+  uint32_t block_px;  // image rows one MCU row of this scan covers
+  bool single;        // single-component scan
+};
+
+McuRowGeometry row_geometry(const DecoderInfo* d) {
+  McuRowGeometry g;
+  g.mcu_px = d->mcu_height_px != 0 ? d->mcu_height_px : 8;
+  g.single = d->comps_in_scan == 1;
+  g.block_px = g.single ? g.mcu_px / d->scan_components[0]->v_samp : g.mcu_px;
+  return g;
+}
+
+// Region decoding: true when the rows decoded so far have passed the bottom
+// of the requested window.
+bool past_region(const DecoderInfo* d) {
+  const DecInfo* o = d->owner;
+  if (o == nullptr || o->region_mode == 0 || d->cropped_reduced_height <= 0) return false;
+  const uint64_t seen = uint64_t(d->visible_height) * rows_consumed(d) /
+                        static_cast<uint32_t>(d->cropped_reduced_height);
+  return seen > uint64_t(o->region_top) + o->region_height;
+}
+
+// Region decoding: true while the current iMCU row lies above the window.
+bool above_region(const DecoderInfo* d, uint32_t mcu_px) {
+  const DecInfo* o = d->owner;
+  return o != nullptr && o->region_mode != 0 && d->imcu_row < o->region_top / mcu_px;
+}
+
+// Decodes one MCU; on failure applies the rule for damaged data: more than
+// 15 picture rows below the MCU's top fail the row, otherwise the MCU
+// decodes flat. Returns false when the row must fail.
+bool decode_one(DecoderInfo* d, McuDecodeFn decode, bool skipping, uint32_t top) {
+  const uint32_t nb = d->blocks_in_mcu;
+  std::memset(d->coef_area, 0, nb * 64 * sizeof(int16_t));
+  const int32_t ok = skipping ? VETAJ_SkipMcu(d) : decode(d, d->imcu.blocks);
+  if (ok != 0) return true;
+  ++d->error_count;
+  if (d->image_height > top && d->image_height - top > 15) return false;
+  std::memset(d->coef_area, 0, nb * 64 * sizeof(int16_t));
+  for (uint32_t b = 0; b < nb; ++b) d->last_nonzero[b] = 0;
+  return true;
+}
+
+// Advances to the next iMCU row: 101 after the last one.
+int32_t next_imcu_row(DecoderInfo* d) {
+  ++d->imcu_row;
+  if (d->imcu_row >= d->total_imcu_rows) return vj::kStatusEnd;
+  VETAJ_SetupiMcu(d);
+  return vj::kStatusNextRow;
+}
+
+// Block (bx, by) of block b within its MCU, and its component.
+struct BlockPlace {
+  const ComponentInfo* comp;
+  uint32_t bx, by;
+};
+
+template <class F>
+void for_each_block(const DecoderInfo* d, F&& f) {
+  const bool single = d->comps_in_scan == 1;
+  uint32_t b = 0;
+  for (uint32_t p = 0; p < d->comps_in_scan; ++p) {
+    const ComponentInfo* c = d->scan_components[p];
+    const uint32_t mw = single ? 1 : c->mcu_width;
+    const uint32_t mh = single ? 1 : c->mcu_height;
+    for (uint32_t by = 0; by < mh; ++by)
+      for (uint32_t bx = 0; bx < mw; ++bx, ++b) f(b, BlockPlace{c, bx, by});
+  }
+}
+
+const uint8_t* centre_for(const DecoderInfo* d, const ComponentInfo* c) {
+  return vj_range_limit_centre(c->index == 0 ? d->range_limit : d->range_limit_chroma);
+}
+
+}  // namespace
+
+int32_t VETAJ_DecodeSingleiMcuResizeNto1(DecoderInfo* d, uint8_t*** rows, McuDecodeFn decode,
+                                         IdctIndexFn index,
+                                         IdctMethodFn method, uint32_t block_step) {
+  if (past_region(d)) return vj::kStatusEnd;
+  const McuRowGeometry g = row_geometry(d);
+  const bool skipping = above_region(d, g.mcu_px);
+  for (uint32_t mr = d->imcu.mcu_row; mr < d->imcu.mcu_rows; ++mr) {
+    const uint32_t scan_row =
+        g.single ? d->imcu_row * d->scan_components[0]->v_samp + mr : d->imcu_row;
+    const uint32_t top = d->imcu_row * g.mcu_px + (g.single ? mr * g.block_px : 0);
+    for (uint32_t col = d->imcu.first_col; col < d->mcus_per_row; ++col) {
+      d->current_mcu_row = scan_row;
+      d->current_mcu_col = col;
+      if (!decode_one(d, decode, skipping, top)) {
+        d->imcu.mcu_row = mr;
+        d->imcu.first_col = col;
+        return vj::kStatusCorrupt;
+      }
+      if (skipping) continue;
+      for_each_block(d, [&](uint32_t b, const BlockPlace& p) {
+        const ComponentInfo* c = p.comp;
+        const uint32_t block_row_in_imcu = g.single ? mr : p.by;
+        if (d->imcu_row * c->v_samp + block_row_in_imcu >= c->height_blocks) return;
+        const uint32_t mw = g.single ? 1 : c->mcu_width;
+        const VETAJ_IdctFn idct = method(d, index(d->last_nonzero[b]));
+        idct(centre_for(d, c), c->multipliers, d->imcu.blocks[b],
+             rows[c->index] + block_row_in_imcu * block_step, (col * mw + p.bx) * block_step);
+      });
+    }
+    d->imcu.first_col = 0;
+  }
+  return next_imcu_row(d);
+}
+
+int32_t VETAJ_DecodeSingleiMcu(DecoderInfo* d, uint8_t*** rows) {
+  return VETAJ_DecodeSingleiMcuResizeNto1(d, rows, d->decode_mcu, full_index,
+                                          installed_slot, 8);
+}
+
+int32_t VETAJ_DecodeSingleiMcuResize2to1(DecoderInfo* d, uint8_t*** rows) {
+  return VETAJ_DecodeSingleiMcuResizeNto1(d, rows, VETAJ_DecodeMcu_2to1,
+                                          VETAJ_GetDctMethodIndex, installed_slot, 4);
+}
+
+int32_t VETAJ_DecodeSingleiMcuResize4to1(DecoderInfo* d, uint8_t*** rows) {
+  return VETAJ_DecodeSingleiMcuResizeNto1(d, rows, VETAJ_DecodeMcu_4to1,
+                                          VETAJ_GetDctMethodIndex, installed_slot, 2);
+}
+
+int32_t VETAJ_DecodeSingleiMcuResize8to1(DecoderInfo* d, uint8_t*** rows) {
+  return VETAJ_DecodeSingleiMcuResizeNto1(d, rows, VETAJ_DecodeMcu_8to1,
+                                          VETAJ_GetDctMethodIndex, installed_slot, 1);
+}
+
+int32_t VETAJ_DecompressOnepass(DecoderInfo* d, uint8_t*** rows) {
+  const uint32_t step = 8u >> d->scale_shift;
+  return VETAJ_DecodeSingleiMcuResizeNto1(d, rows, d->decode_mcu_reduced,
+                                          VETAJ_GetDctMethodIndex, installed_slot, step);
+}
+
+namespace {
+
+// The 1/8 sample of a DC value, through the 1x1 transform.
+inline void store_dc(DecoderInfo* d, const ComponentInfo* c, int32_t dc, uint8_t** row,
+                     uint32_t col) {
+  int16_t block[64];
+  block[0] = static_cast<int16_t>(dc);
+  VETAJ_DoIdct_1x1(centre_for(d, c), c->multipliers, block, row, col);
+}
+
+// Beyond 1/8: DC values only. With `average`, the DC values of 2 x 2
+// neighbouring MCUs (two columns of two iMCU rows) are averaged into one
+// sample per block position; otherwise one MCU column in a run of k + 1 is
+// passed over and one iMCU row in 2^k reaches the output.
+int32_t dc_only_rows(DecoderInfo* d, uint8_t*** rows, bool average) {
+  if (past_region(d)) return vj::kStatusEnd;
+  const uint32_t k = d->scale_shift - 3;  // 1, 2, 3
+  const uint32_t shift = d->scale_shift;
+  const uint32_t period = average ? 2u : (1u << k);
+  const McuRowGeometry g = row_geometry(d);
+  const uint32_t nb = d->blocks_in_mcu;
+  const uint32_t pairs = (d->mcus_per_row + 1) / 2;
+  if (average && d->dc_sums == nullptr) {
+    d->dc_sums = vj::alloc_zeroed<int32_t>(pairs * kMaxBlocksInMcu);
+    if (d->dc_sums == nullptr) return vj::kStatusCorrupt;
+  }
+  const uint32_t rows_here = d->total_imcu_rows - d->imcu_row;
+  const uint32_t rows_in_group = rows_here < period ? rows_here : period;
+  for (uint32_t p = 0; p < period && d->imcu_row < d->total_imcu_rows; ++p) {
+    for (uint32_t mr = d->imcu.mcu_row; mr < d->imcu.mcu_rows; ++mr) {
+      const uint32_t scan_row =
+          g.single ? d->imcu_row * d->scan_components[0]->v_samp + mr : d->imcu_row;
+      const uint32_t top = d->imcu_row * g.mcu_px + (g.single ? mr * g.block_px : 0);
+      uint32_t run = 0;
+      for (uint32_t col = d->imcu.first_col; col < d->mcus_per_row; ++col) {
+        d->current_mcu_row = scan_row;
+        d->current_mcu_col = col;
+        if (!decode_one(d, VETAJ_DecodeMcu_8to1, false, top)) {
+          d->imcu.mcu_row = mr;
+          d->imcu.first_col = col;
+          return vj::kStatusCorrupt;
+        }
+        if (average) {
+          // Each DC enters with the weight of the MCUs that share its sample.
+          const uint32_t cols_in_pair = (col | 1) < d->mcus_per_row ? 2u : 1u;
+          const uint32_t n = cols_in_pair * rows_in_group;
+          const int32_t half = static_cast<int32_t>(n / 2);
+          const uint32_t log = n == 4 ? 2 : (n == 2 ? 1 : 0);
+          int32_t* slot = d->dc_sums + (col / 2) * kMaxBlocksInMcu;
+          for (uint32_t b = 0; b < nb; ++b) slot[b] += (d->imcu.blocks[b][0] + half) >> log;
+          continue;
+        }
+        if (p != 0) continue;  // iMCU rows between the kept ones are only decoded
+        if (run == k) {
+          run = 0;
+          continue;
+        }
+        ++run;
+        for_each_block(d, [&](uint32_t b, const BlockPlace& pl) {
+          const ComponentInfo* c = pl.comp;
+          const uint32_t row = g.single ? mr : pl.by;
+          const uint32_t x = ((c->h_samp * 8u * col) >> shift) + pl.bx;
+          store_dc(d, c, d->imcu.blocks[b][0], rows[c->index] + row, x);
+        });
+      }
+      d->imcu.first_col = 0;
+    }
+    ++d->imcu_row;
+    if (d->imcu_row < d->total_imcu_rows) VETAJ_SetupiMcu(d);
+  }
+  if (average) {
+    for (uint32_t pc = 0; pc < pairs; ++pc) {
+      int32_t* slot = d->dc_sums + pc * kMaxBlocksInMcu;
+      for_each_block(d, [&](uint32_t b, const BlockPlace& pl) {
+        const ComponentInfo* c = pl.comp;
+        store_dc(d, c, slot[b], rows[c->index] + pl.by, pc * c->h_samp + pl.bx);
+        slot[b] = 0;
+      });
+    }
+  }
+  return d->imcu_row >= d->total_imcu_rows ? vj::kStatusEnd : vj::kStatusNextRow;
+}
+
+}  // namespace
+
+int32_t VETAJ_DecodeSingleiMcuResizeMore16(DecoderInfo* d, uint8_t*** rows) {
+  return dc_only_rows(d, rows, false);
+}
+int32_t VETAJ_DecodeSingleiMcuResize16_YUV420(DecoderInfo* d, uint8_t*** rows) {
+  return dc_only_rows(d, rows, true);
+}
+int32_t VETAJ_DecodeSingleiMcuResize16_YUV422H2V1(DecoderInfo* d, uint8_t*** rows) {
+  return dc_only_rows(d, rows, true);
+}
+int32_t VETAJ_DecodeSingleiMcuResize16_YUV444(DecoderInfo* d, uint8_t*** rows) {
+  return dc_only_rows(d, rows, true);
+}
+
+int32_t VETAJ_DecodeSingleiMcu_resize(DecoderInfo* d, uint8_t*** rows) {
+  const uint32_t s = d->scale_shift;
+  if (s == 0) return vj::kStatusFail;
+  if (d->scale_num == 3) {
+    return VETAJ_DecodeSingleiMcuResizeNto1(d, rows, VETAJ_DecodeMcu_8to3,
+                                            VETAJ_GetDctMethodIndexFirst,
+                                            VETAJ_GetDctMethod8to3, 3);
+  }
+  if (s <= 3) {
+    if (d->fast_reduced) return VETAJ_DecompressOnepass(d, rows);
+    switch (s) {
+      case 1: return VETAJ_DecodeSingleiMcuResize2to1(d, rows);
+      case 2: return VETAJ_DecodeSingleiMcuResize4to1(d, rows);
+      default: return VETAJ_DecodeSingleiMcuResize8to1(d, rows);
+    }
+  }
+  // Beyond 1/8: three-component baseline pictures at 1/16 average 2 x 2 MCUs.
+  if (s == 4 && d->num_components == 3 && d->comps_in_scan == 3 &&
+      d->marker->frame_kind == kFrameBaseline && d->components[1].h_samp == 1 &&
+      d->components[1].v_samp == 1 && d->components[2].h_samp == 1 &&
+      d->components[2].v_samp == 1) {
+    const uint32_t mh = d->max_h_samp, mv = d->max_v_samp;
+    if (mh == 2 && mv == 1) return VETAJ_DecodeSingleiMcuResize16_YUV422H2V1(d, rows);
+    if (mh == 1 && mv == 1) return VETAJ_DecodeSingleiMcuResize16_YUV444(d, rows);
+    if (mh == 2 && mv == 2) return VETAJ_DecodeSingleiMcuResize16_YUV420(d, rows);
+  }
+  return VETAJ_DecodeSingleiMcuResizeMore16(d, rows);
+}
+
+namespace {
+
+// Decodes the next iMCU row into the sample buffer.
+int32_t fill_buffer(DecoderInfo* d) {
+  RowController& ctl = d->controller;
+  uint8_t** lists[4];
+  for (uint32_t ci = 0; ci < d->num_components; ++ci) lists[ci] = d->sample_lists[ci][0];
+  const int32_t status = d->imcu.decode_row(d, lists);
+  if (status == vj::kStatusCorrupt || status == vj::kStatusFail) return vj::kStatusFail;
+  if (status == vj::kStatusEnd) ctl.finished = 1;
+  ctl.buffer_full = 1;
+  ctl.group_counter = 0;
+  ++ctl.imcu_rows_done;
+  return status;
+}
+
+// The buffer is free again once its eight full-size row groups are out.
+void release_buffer(DecoderInfo* d) {
+  if (d->controller.group_counter >= 8 || d->upsampler->rows_to_go == 0)
+    d->controller.buffer_full = 0;
+}
+
+}  // namespace
+
+int32_t VETAJ_ProcessData_resize(DecoderInfo* d, uint8_t* output, uint32_t* row_ctr,
+                                 uint32_t rows_avail) {
+  RowController& ctl = d->controller;
+  int32_t status = 0;
+  if (ctl.buffer_full == 0) {
+    if (ctl.finished != 0) return vj::kStatusEnd;
+    if (d->check_callback != nullptr &&
+        d->check_callback(d->owner, static_cast<int32_t>(rows_consumed(d))) == 0)
+      return vj::kStatusFail;
+    status = fill_buffer(d);
+    if (status == vj::kStatusFail) return status;
+  }
+  VETAJ_SetupUpsample(d, output, row_ctr, rows_avail);
+  release_buffer(d);
+  return status == vj::kStatusEnd ? 0 : status;
+}
+
+int32_t VETAJ_ProcessDataSkipRow(DecoderInfo* d, uint8_t* output, uint32_t* row_ctr,
+                                 uint32_t rows_avail) {
+  RowController& ctl = d->controller;
+  int32_t status = 0;
+  if (ctl.buffer_full == 0) {
+    if (ctl.finished != 0) return vj::kStatusEnd;
+    status = fill_buffer(d);
+    if (status == vj::kStatusFail) return status;
+  }
+  VETAJ_SkipRowUpsample(d, output, row_ctr, rows_avail);
+  release_buffer(d);
+  return status == vj::kStatusEnd ? 0 : status;
+}
+
+uint32_t GCD(uint32_t a, uint32_t b) {
+  while (b != 0) {
+    const uint32_t t = a % b;
+    a = b;
+    b = t;
+  }
+  return a;
+}
+
+uint32_t LCM(uint32_t a, uint32_t b) {
+  const uint32_t g = GCD(a, b);
+  return g == 0 ? 0 : a / g * b;
+}
+
+uint32_t round_up_pow2(uint32_t x, uint32_t a) { return (x + a - 1) & ~(a - 1); }
+
+uint32_t VETAJ_GetMcuSampleWidth(DecoderInfo* d) {
+  const uint32_t w = 8u * d->max_h_samp;
+  const DecInfo* o = d->owner;
+  if (o != nullptr && o->region_mode != 0 && d->num_components == 3 && d->max_h_samp == 2 &&
+      d->max_v_samp == 2 && d->comps_in_scan == 1 && d->mcus_per_row != 0)
+    return ((d->image_width + w) / w * w) / d->mcus_per_row;
+  return w;
+}
+
+void vj_install_row_functions(DecoderInfo* d) {
+  const uint32_t r = d->scale_shift;
+  if (r == 0) {
+    d->imcu.decode_row = VETAJ_DecodeSingleiMcu;
+    return;
+  }
+  d->imcu.decode_row = VETAJ_DecodeSingleiMcu_resize;
+  if (d->fast_reduced && d->scale_num == 1 && r <= 3) {
+    static const McuDecodeFn kReduced[4] = {nullptr, VETAJ_DecodeMcu_2to1, VETAJ_DecodeMcu_4to1,
+                                            VETAJ_DecodeMcu_8to1};
+    d->decode_mcu_reduced = kReduced[r];
+  }
+}
