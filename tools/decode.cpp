@@ -299,8 +299,8 @@ int run_decode(int argc, char** argv) {
     return kExitFailure;
   }
   clear_buffer(format, buffer.get(), bytes, r.width, r.height);
-  if (format.layout == Layout::kYuv420) {
-    // The planes of format 2 are laid out for these sizes: the buffer's.
+  if (format.layout == Layout::kYuv420 && r.fit != KOLVAVETA_OPT_FIT_ROWLEN) {
+    // The planes of format 2 cover the whole buffer.
     object->region_width = r.width;
     object->region_height = r.height;
   }
@@ -326,17 +326,17 @@ int run_decode(int argc, char** argv) {
   if (r.raw) return write_raw(r.output, buffer.get(), bytes) ? kExitOk : kExitFailure;
 
   // The picture to view: the whole buffer, or, when the fit takes the output
-  // width as the row length, the output area at its start.
+  // size as the buffer size, the output area (turned by a quarter-turn
+  // rotation) packed at its start.
   BufferGeometry geometry{r.width, r.height, 0, r.width, r.height};
   if (r.fit == KOLVAVETA_OPT_FIT_ROWLEN) {
-    geometry.width = static_cast<uint32_t>(object->output_width);
-    geometry.height = static_cast<uint32_t>(object->output_height);
+    const bool turned = quarter_turn(object->options & KOLVAVETA_OPT_ROTATE_MASK);
+    const auto out_w = static_cast<uint32_t>(object->output_width);
+    const auto out_h = static_cast<uint32_t>(object->output_height);
+    geometry.width = geometry.planes_width = turned ? out_h : out_w;
+    geometry.height = geometry.planes_height = turned ? out_w : out_h;
   }
   geometry.row_bytes = size_t(geometry.width) * bytes_per_pixel(format.layout);
-  if (format.layout == Layout::kYuv420 && object->region_width != 0 && object->region_height != 0) {
-    geometry.planes_width = object->region_width;
-    geometry.planes_height = object->region_height;
-  }
   Picture picture;
   if (!convert_buffer(format, buffer.get(), bytes, geometry, &picture)) {
     report("%s: the decoder reported an output area of %ux%u that does not fit the %ux%u buffer",
