@@ -27,9 +27,9 @@ struct DecodeRequest {
   const char* input = nullptr;
   const char* output = nullptr;
   bool has_size = false;
-  uint32_t width = 0;   // buffer size
+  uint32_t width = 0;  // buffer size
   uint32_t height = 0;
-  uint32_t scale = 0;   // sample_size; 0 for none
+  uint32_t scale = 0;  // sample_size; 0 for none
   uint32_t fit = KOLVAVETA_OPT_FIT_CENTRE;
   uint32_t rotation = KOLVAVETA_OPT_ROTATE_0;
   bool exif_orient = false;
@@ -82,16 +82,17 @@ bool parse_choice(const char* text, const std::pair<const char*, T> (&choices)[N
 
 bool parse_fit(DecodeRequest* r, const char* text) {
   static const std::pair<const char*, uint32_t> kFits[] = {
-      {"centre", KOLVAVETA_OPT_FIT_CENTRE},   {"center", KOLVAVETA_OPT_FIT_CENTRE},
-      {"rowlen", KOLVAVETA_OPT_FIT_ROWLEN},   {"topleft", KOLVAVETA_OPT_FIT_TOPLEFT},
-      {"fill", KOLVAVETA_OPT_FIT_FILL},       {"stretch", KOLVAVETA_OPT_FIT_STRETCH}};
+      {"centre", KOLVAVETA_OPT_FIT_CENTRE}, {"center", KOLVAVETA_OPT_FIT_CENTRE},
+      {"rowlen", KOLVAVETA_OPT_FIT_ROWLEN}, {"topleft", KOLVAVETA_OPT_FIT_TOPLEFT},
+      {"fill", KOLVAVETA_OPT_FIT_FILL},     {"stretch", KOLVAVETA_OPT_FIT_STRETCH}};
   return parse_choice(text, kFits, &r->fit);
 }
 
 bool parse_rotate(DecodeRequest* r, const char* text) {
-  static const std::pair<const char*, uint32_t> kRotations[] = {
-      {"0", KOLVAVETA_OPT_ROTATE_0},     {"90", KOLVAVETA_OPT_ROTATE_90},
-      {"180", KOLVAVETA_OPT_ROTATE_180}, {"270", KOLVAVETA_OPT_ROTATE_270}};
+  static const std::pair<const char*, uint32_t> kRotations[] = {{"0", KOLVAVETA_OPT_ROTATE_0},
+                                                                {"90", KOLVAVETA_OPT_ROTATE_90},
+                                                                {"180", KOLVAVETA_OPT_ROTATE_180},
+                                                                {"270", KOLVAVETA_OPT_ROTATE_270}};
   return parse_choice(text, kRotations, &r->rotation);
 }
 
@@ -122,8 +123,8 @@ bool set_progress(DecodeRequest* r, const char*) { return r->progress = true; }
 
 struct OptionSpec {
   const char* name;
-  const char* alias;      // short form, or null
-  const char* expected;   // what the value must be; null for a flag
+  const char* alias;     // short form, or null
+  const char* expected;  // what the value must be; null for a flag
   bool (*apply)(DecodeRequest*, const char* value);
 };
 
@@ -183,8 +184,7 @@ Parsed parse_arguments(int argc, char** argv, DecodeRequest* r) {
       return Parsed::kError;
     }
     if (!spec->apply(r, value)) {
-      usage_error("decode: bad value '%s' for %s: expected %s", value, spec->name,
-                  spec->expected);
+      usage_error("decode: bad value '%s' for %s: expected %s", value, spec->name, spec->expected);
       return Parsed::kError;
     }
   }
@@ -254,16 +254,13 @@ struct FreeDeleter {
 int run_decode(int argc, char** argv) {
   DecodeRequest r;
   switch (parse_arguments(argc, argv, &r)) {
-    case Parsed::kHelp:
-      print_usage(stdout);
-      return kExitOk;
-    case Parsed::kError:
-      return kExitUsage;
-    case Parsed::kGo:
-      break;
+    case Parsed::kHelp: print_usage(stdout); return kExitOk;
+    case Parsed::kError: return kExitUsage;
+    case Parsed::kGo: break;
   }
   const OutputFormat& format = *r.format;
-  const uint32_t options = r.thumb | r.rotation | r.fit | (r.exif_orient ? KOLVAVETA_OPT_EXIF_ORIENT : 0);
+  const uint32_t options =
+      r.thumb | r.rotation | r.fit | (r.exif_orient ? KOLVAVETA_OPT_EXIF_ORIENT : 0);
 
   Decoder decoder;
   if (!decoder.open(r.input, format.code, options)) return kExitFailure;
@@ -306,7 +303,8 @@ int run_decode(int argc, char** argv) {
   }
 
   ProgressBar bar;
-  const uint64_t pixels = uint64_t(static_cast<uint32_t>(info.width)) * static_cast<uint32_t>(info.height);
+  const uint64_t pixels =
+      uint64_t(static_cast<uint32_t>(info.width)) * static_cast<uint32_t>(info.height);
   if (r.progress || (pixels > kProgressPixels && isatty(STDERR_FILENO))) {
     if (!attach_progress(object, &bar)) {
       report("out of memory");

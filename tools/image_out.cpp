@@ -4,6 +4,7 @@
 
 #include <cerrno>
 #include <csetjmp>
+#include <cstdint>
 #include <cstring>
 
 #include "tool.h"
@@ -29,18 +30,17 @@ constexpr uint64_t kMaxBufferBytes = 0x7FFFFFFFu;
 
 // Place of the two chroma planes after a luma plane of pw x ph bytes.
 struct ChromaPlanes {
-  size_t u_offset;
-  size_t v_offset;
-  size_t stride;  // (pw + 1) / 2
-  size_t end;     // bytes of all three planes
+  uint64_t u_offset;
+  uint64_t v_offset;
+  uint64_t stride;  // (pw + 1) / 2
+  uint64_t end;     // bytes of all three planes
 };
 
 ChromaPlanes chroma_planes(uint64_t pw, uint64_t ph) {
   const uint64_t cw = (pw + 1) / 2;
   const uint64_t ch = (ph + 1) / 2;
   const uint64_t luma = pw * ph;
-  return {static_cast<size_t>(luma), static_cast<size_t>(luma + cw * ch),
-          static_cast<size_t>(cw), static_cast<size_t>(luma + 2 * cw * ch)};
+  return {luma, luma + cw * ch, cw, luma + 2 * cw * ch};
 }
 
 uint8_t clamp_byte(int32_t v) { return static_cast<uint8_t>(v < 0 ? 0 : (v > 255 ? 255 : v)); }
@@ -55,7 +55,7 @@ void ycbcr_to_rgb(int32_t y, int32_t cb, int32_t cr, uint8_t* rgb) {
   cb -= 128;
   cr -= 128;
   rgb[0] = clamp_byte(y + ((kCrToR * cr + kHalf) >> 16));
-  rgb[1] = clamp_byte(y - ((kCbToG * cb + kCrToG * cr - kHalf) >> 16));
+  rgb[1] = clamp_byte(y + ((kHalf - kCbToG * cb - kCrToG * cr) >> 16));
   rgb[2] = clamp_byte(y + ((kCbToB * cb + kHalf) >> 16));
 }
 
@@ -78,11 +78,8 @@ void convert_row(const OutputFormat& format, const uint8_t* src, uint32_t width,
         out[2] = expand5(v & 0x1F);
       }
       break;
-    case Layout::kRgb24:
-      std::memcpy(out, src, size_t(width) * 3);
-      break;
-    case Layout::kYuv420:
-      break;  // planar: see convert_buffer
+    case Layout::kRgb24: std::memcpy(out, src, size_t(width) * 3); break;
+    case Layout::kYuv420: break;  // planar: see convert_buffer
   }
 }
 
@@ -119,12 +116,13 @@ size_t buffer_bytes(const OutputFormat& format, uint32_t width, uint32_t height)
   return bytes <= kMaxBufferBytes ? static_cast<size_t>(bytes) : 0;
 }
 
-void clear_buffer(const OutputFormat& format, uint8_t* buffer, size_t bytes,
-                  uint32_t planes_width, uint32_t planes_height) {
+void clear_buffer(const OutputFormat& format, uint8_t* buffer, size_t bytes, uint32_t planes_width,
+                  uint32_t planes_height) {
   std::memset(buffer, 0, bytes);
   if (format.layout != Layout::kYuv420) return;
   const ChromaPlanes planes = chroma_planes(planes_width, planes_height);
-  if (planes.end <= bytes) std::memset(buffer + planes.u_offset, 128, planes.end - planes.u_offset);
+  if (planes.end <= bytes)
+    std::memset(buffer + planes.u_offset, 128, static_cast<size_t>(planes.end - planes.u_offset));
 }
 
 bool convert_buffer(const OutputFormat& format, const uint8_t* buffer, size_t bytes,
@@ -133,25 +131,27 @@ bool convert_buffer(const OutputFormat& format, const uint8_t* buffer, size_t by
   picture->width = g.width;
   picture->height = g.height;
   picture->channels = format.layout == Layout::kPacked32 ? 4 : 3;
+  if (uint64_t(g.width) * g.height * picture->channels > SIZE_MAX / 2) return false;
   const size_t out_row = size_t(g.width) * picture->channels;
 
   if (format.layout == Layout::kYuv420) {
     const ChromaPlanes planes = chroma_planes(g.planes_width, g.planes_height);
-    if (g.width > g.planes_width || g.height > g.planes_height || planes.end > bytes)
-      return false;
+    if (g.width > g.planes_width || g.height > g.planes_height || planes.end > bytes) return false;
     picture->pixels.assign(out_row * g.height, '\0');
     for (uint32_t y = 0; y < g.height; ++y) {
       const uint8_t* luma = buffer + size_t(y) * g.planes_width;
       const uint8_t* u = buffer + planes.u_offset + size_t(y / 2) * planes.stride;
       const uint8_t* v = buffer + planes.v_offset + size_t(y / 2) * planes.stride;
       auto* out = reinterpret_cast<uint8_t*>(&picture->pixels[y * out_row]);
-      for (uint32_t x = 0; x < g.width; ++x, out += 3) ycbcr_to_rgb(luma[x], u[x / 2], v[x / 2], out);
+      for (uint32_t x = 0; x < g.width; ++x, out += 3)
+        ycbcr_to_rgb(luma[x], u[x / 2], v[x / 2], out);
     }
     return true;
   }
 
-  const size_t used_row = size_t(g.width) * bytes_per_pixel(format.layout);
-  if (g.row_bytes < used_row || (g.height - 1) * g.row_bytes + used_row > bytes) return false;
+  const uint64_t used_row = uint64_t(g.width) * bytes_per_pixel(format.layout);
+  if (g.row_bytes < used_row || uint64_t(g.height - 1) * g.row_bytes + used_row > bytes)
+    return false;
   picture->pixels.assign(out_row * g.height, '\0');
   for (uint32_t y = 0; y < g.height; ++y) {
     convert_row(format, buffer + y * g.row_bytes, g.width,
@@ -199,8 +199,8 @@ bool write_png(const char* path, const Picture& picture) {
   }
   png_init_io(png, file);
   png_set_IHDR(png, info, picture.width, picture.height, 8,
-               picture.channels == 4 ? PNG_COLOR_TYPE_RGBA : PNG_COLOR_TYPE_RGB,
-               PNG_INTERLACE_NONE, PNG_COMPRESSION_TYPE_DEFAULT, PNG_FILTER_TYPE_DEFAULT);
+               picture.channels == 4 ? PNG_COLOR_TYPE_RGBA : PNG_COLOR_TYPE_RGB, PNG_INTERLACE_NONE,
+               PNG_COMPRESSION_TYPE_DEFAULT, PNG_FILTER_TYPE_DEFAULT);
   png_write_info(png, info);
   const size_t row = size_t(picture.width) * picture.channels;
   const auto* pixels = reinterpret_cast<const uint8_t*>(picture.pixels.data());

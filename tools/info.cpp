@@ -88,10 +88,12 @@ void print_gps(const GpsInfo& gps) {
 
 void print_thumbnail(const ThumbnailInfo& t) {
   if (t.present == 0) return;
-  std::string text = t.format == kThumbJpeg ? "JPEG" : "uncompressed";
+  char size[32] = "";
   if (t.width > 0 && t.height > 0)
-    text += " " + std::to_string(t.width) + "x" + std::to_string(t.height);
-  text += ", " + std::to_string(t.length) + " bytes at offset " + std::to_string(t.offset);
+    std::snprintf(size, sizeof size, " %" PRId32 "x%" PRId32, t.width, t.height);
+  char text[128];
+  std::snprintf(text, sizeof text, "%s%s, %" PRIu32 " bytes at offset %" PRIu32,
+                t.format == kThumbJpeg ? "JPEG" : "uncompressed", size, t.length, t.offset);
   field("thumbnail:", text);
 }
 
@@ -102,8 +104,8 @@ void print_exif(const ExifInfo* exif) {
   }
   std::printf("Exif:\n");
   if (exif->orientation != 0)
-    field("orientation:", std::to_string(exif->orientation) + " (" +
-                              orientation_meaning(exif->orientation) + ")");
+    field("orientation:",
+          std::to_string(exif->orientation) + " (" + orientation_meaning(exif->orientation) + ")");
   string_field("make:", exif->make);
   string_field("model:", exif->model);
   string_field("software:", exif->software);
@@ -138,8 +140,7 @@ int run_info(int argc, char** argv) {
   if (path == nullptr) return usage_error("info: no input file");
 
   Decoder decoder;
-  if (!decoder.open(path, KOLVAVETA_FMT_RGBA8888, KOLVAVETA_OPT_THUMB_NEVER))
-    return kExitFailure;
+  if (!decoder.open(path, KOLVAVETA_FMT_RGBA8888, KOLVAVETA_OPT_THUMB_NEVER)) return kExitFailure;
   JpegInfo info{};
   const int32_t type = decoder.read_summary(&info);
   if (type == KOLVAVETA_IMAGE_UNKNOWN) return kExitFailure;
@@ -150,8 +151,7 @@ int run_info(int argc, char** argv) {
   std::printf("height:             %" PRId32 "\n", info.height);
   std::printf("progressive:        %s\n", info.progressive != 0 ? "yes" : "no");
   std::printf("restart interval:   %" PRId32 "\n", info.restart_interval);
-  std::printf("max sampling:       %" PRId32 "x%" PRId32 "\n", info.max_h_samp,
-              info.max_v_samp);
+  std::printf("max sampling:       %" PRId32 "x%" PRId32 "\n", info.max_h_samp, info.max_v_samp);
   std::printf("input size:         %" PRIu32 " bytes\n", info.input_size);
   if (type == KOLVAVETA_IMAGE_JPEG) {
     const std::string problem = diagnose_jpeg(path);

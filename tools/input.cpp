@@ -55,16 +55,21 @@ const char* frame_problem(uint8_t marker) {
   switch (marker) {
     case 0xC1: return "extended sequential frame (SOF1)";
     case 0xC3: return "lossless frame (SOF3)";
-    case 0xC5: case 0xC6: case 0xC7: return "hierarchical frame";
-    case 0xC9: case 0xCA: case 0xCB: return "arithmetic-coded frame";
-    case 0xCD: case 0xCE: case 0xCF: return "hierarchical arithmetic-coded frame";
+    case 0xC5:
+    case 0xC6:
+    case 0xC7: return "hierarchical frame";
+    case 0xC9:
+    case 0xCA:
+    case 0xCB: return "arithmetic-coded frame";
+    case 0xCD:
+    case 0xCE:
+    case 0xCF: return "hierarchical arithmetic-coded frame";
     default: return nullptr;
   }
 }
 
 bool is_frame_marker(uint8_t marker) {
-  return marker >= 0xC0 && marker <= 0xCF && marker != 0xC4 && marker != 0xC8 &&
-         marker != 0xCC;
+  return marker >= 0xC0 && marker <= 0xCF && marker != 0xC4 && marker != 0xC8 && marker != 0xCC;
 }
 
 // Walks the marker segments from the start-of-image marker at `position` to
@@ -87,7 +92,8 @@ std::string judge_frame(FILE* file, long position) {
     if (marker == 0xD9) return "the JPEG data ends before a frame header";
     const int hi = std::fgetc(file);
     const int lo = std::fgetc(file);
-    if (hi == EOF || lo == EOF) return "the JPEG data ends inside a marker segment (truncated file)";
+    if (hi == EOF || lo == EOF)
+      return "the JPEG data ends inside a marker segment (truncated file)";
     const long length = (hi << 8) | lo;
     if (length < 2) return "corrupt JPEG header (bad marker segment length)";
     if (marker == 0xDA) return "corrupt JPEG header (scan without a frame header)";
@@ -174,9 +180,7 @@ bool Decoder::open(const char* path, int32_t output_format, uint32_t options) {
                                     output_format, options);
   if (object_ == nullptr) {
     switch (gKOLVAVETA_Error) {
-      case KOLVAVETA_ERR_NO_MEMORY:
-        report("cannot open '%s': out of memory", path);
-        break;
+      case KOLVAVETA_ERR_NO_MEMORY: report("cannot open '%s': out of memory", path); break;
       case KOLVAVETA_ERR_OPEN_FILE:
         report("cannot open '%s': %s", path, errno != 0 ? std::strerror(errno) : "open failed");
         break;
@@ -210,15 +214,11 @@ void Decoder::report_decode_failure() const {
   std::string reason = diagnose_jpeg(path());
   if (reason.empty()) {
     switch (gKOLVAVETA_Error) {
-      case KOLVAVETA_ERR_NO_MEMORY:
-        reason = "out of memory";
-        break;
+      case KOLVAVETA_ERR_NO_MEMORY: reason = "out of memory"; break;
       case KOLVAVETA_ERR_SETUP:
         reason = "the decoder does not support this picture (tables, sampling or colour space)";
         break;
-      default:
-        reason = "corrupt or truncated JPEG data";
-        break;
+      default: reason = "corrupt or truncated JPEG data"; break;
     }
   }
   report("%s: decoding failed: %s", path(), reason.c_str());

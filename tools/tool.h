@@ -94,9 +94,9 @@ enum class Layout { kPacked32, kRgb565, kRgb24, kYuv420 };
 
 struct OutputFormat {
   const char* name;
-  int32_t code;         // KOLVAVETA_FMT_ code
+  int32_t code;  // KOLVAVETA_FMT_ code
   Layout layout;
-  uint8_t channel[4];   // kPacked32: byte offsets of red, green, blue, alpha
+  uint8_t channel[4];  // kPacked32: byte offsets of red, green, blue, alpha
 };
 
 // Bytes per pixel of a packed layout; 1 (the luma plane) for planar output.
@@ -106,9 +106,9 @@ const OutputFormat* find_output_format(const char* name);
 
 // The picture area of a decode buffer.
 struct BufferGeometry {
-  uint32_t width;      // pixels per row of the picture to write out
-  uint32_t height;     // rows
-  size_t row_bytes;    // bytes between rows (packed layouts), luma row bytes (planar)
+  uint32_t width;          // pixels per row of the picture to write out
+  uint32_t height;         // rows
+  size_t row_bytes;        // bytes between rows (packed layouts), luma row bytes (planar)
   uint32_t planes_width;   // planar: luma plane size from which the chroma
   uint32_t planes_height;  // planes' place and size follow
 };
@@ -119,8 +119,8 @@ size_t buffer_bytes(const OutputFormat& format, uint32_t width, uint32_t height)
 
 // Fills a fresh buffer so that parts the decoder leaves alone read as black
 // (planar chroma at its mid value); packed formats stay zero (transparent).
-void clear_buffer(const OutputFormat& format, uint8_t* buffer, size_t bytes,
-                  uint32_t planes_width, uint32_t planes_height);
+void clear_buffer(const OutputFormat& format, uint8_t* buffer, size_t bytes, uint32_t planes_width,
+                  uint32_t planes_height);
 
 // 8-bit RGB or RGBA picture for viewing.
 struct Picture {

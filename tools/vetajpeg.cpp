@@ -4,6 +4,7 @@
 //   vetajpeg decode FILE -o OUT [options]   decode to a PNG (or the raw buffer)
 #include <cstdarg>
 #include <cstring>
+#include <new>
 
 #include "tool.h"
 
@@ -99,7 +100,14 @@ int main(int argc, char** argv) {
     std::printf("vetajpeg, libVetaJpegDecoder %d\n", static_cast<int>(VETAJ_GetVersion()));
     return kExitOk;
   }
-  if (std::strcmp(command, "info") == 0) return run_info(argc - 1, argv + 1);
-  if (std::strcmp(command, "decode") == 0) return run_decode(argc - 1, argv + 1);
+  // The library reports its failures by result codes; only the tool's own
+  // containers can throw, when memory runs out.
+  try {
+    if (std::strcmp(command, "info") == 0) return run_info(argc - 1, argv + 1);
+    if (std::strcmp(command, "decode") == 0) return run_decode(argc - 1, argv + 1);
+  } catch (const std::bad_alloc&) {
+    report("out of memory");
+    return kExitFailure;
+  }
   return usage_error("unknown command '%s'", command);
 }
