@@ -1,6 +1,10 @@
 // Life cycle of a DecoderInfo's owned memory.
 #include "drivers/decoder.h"
 
+#include "drivers/init.h"
+#include "recon/colour.h"
+#include "recon/upsample.h"
+
 bool vj_register_derived_table(DecoderInfo* d, DerivedHuffTable* table) {
   if (d->derived_count == d->derived_capacity) {
     const uint32_t capacity = d->derived_capacity == 0 ? 32 : d->derived_capacity * 2;
@@ -34,6 +38,21 @@ void VETAJ_DeleteDecoderInfo(DecoderInfo* d) {
     vj::os_free(d->components);
   }
   vj::fake_free(d->marker);
+  vj_release_upsampler(d);
+  for (uint32_t ci = 0; ci < 4; ++ci) {
+    vj::free_sample_array(d->sample_rows[ci]);
+    vj::fake_free(d->sample_list_alloc[ci]);
+    d->sample_lists[ci][0] = d->sample_lists[ci][1] = nullptr;
+  }
+  if (d->converter != nullptr) {
+    vj_release_converter(d);
+    vj::os_free(d->converter);
+  }
+  vj::fake_free(d->range_limit_alloc);
+  vj::fake_free(d->range_limit_chroma_alloc);
+  d->range_limit = d->range_limit_chroma = nullptr;
+  vj::fake_free(d->coef_area);
+  vj::fake_free(d->prog_workspace);
 }
 
 void vj_setup_component_geometry(DecoderInfo* d) {

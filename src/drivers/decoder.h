@@ -182,6 +182,17 @@ struct DecoderInfo {
   Upsampler* upsampler;
   VETAJ_IdctFn idct_slots[29];
   RowController controller;
+
+  // --- Sample buffers: one iMCU row of every component, reached through
+  // two row-pointer lists that let the previous row group survive the
+  // decode of the next iMCU row ---
+  uint8_t** sample_rows[4];        // the rows (one block per component)
+  uint8_t** sample_lists[4][2];    // list heads (G entries in front of each)
+  uint8_t** sample_list_alloc[4];  // both lists of a component in one block
+  uint32_t imcu_row;               // iMCU rows decoded so far
+  uint32_t total_imcu_rows;
+  uint32_t skip_output;            // rows are consumed without being written
+  uint32_t progress_row;           // row counter of the progress checkpoints
 };
 
 // Releases everything the decoder owns (not the DecoderInfo itself).

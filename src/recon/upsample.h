@@ -21,4 +21,17 @@ struct Upsampler {
   uint8_t** color_alloc[4];   // colour buffers this record owns
 };
 
+// Chooses the upsampling methods, installs the transform slots, chooses the
+// fused writer and builds the sample buffers. 200 or 201.
+int32_t VETAJ_InitUpsampler(DecoderInfo* decoder);
+// Row driver: upsamples the current row group when needed and converts at
+// most rows_avail - *row_ctr rows, advancing *row_ctr.
+void VETAJ_SetupUpsample(DecoderInfo* decoder, uint8_t* output, uint32_t* row_ctr,
+                         uint32_t rows_avail);
+// As VETAJ_SetupUpsample, consuming rows without converting them.
+void VETAJ_SkipRowUpsample(DecoderInfo* decoder, uint8_t* output, uint32_t* row_ctr,
+                           uint32_t rows_avail);
+// Frees the upsampler record and its colour buffers.
+void vj_release_upsampler(DecoderInfo* decoder);
+
 #endif  // VETAJ_RECON_UPSAMPLE_H

@@ -1,0 +1,385 @@
+// The whole-image decode.
+#include "drivers/decode.h"
+
+#include <cstring>
+
+#include "entropy/mcu.h"
+#include "meta/exif.h"
+#include "recon/colour.h"
+#include "recon/idct.h"
+#include "recon/upsample.h"
+
+namespace vj {
+void set_wraparound_lists(DecoderInfo* d);
+uint32_t set_bottom_lists(DecoderInfo* d, uint32_t which);
+}  // namespace vj
+
+
+namespace {
+
+constexpr uint32_t kGroups = 8;  // row groups of one iMCU row
+
+enum ContextState : uint32_t { kPrepare = 0, kProcess = 1, kPostponed = 2 };
+
+// Rows of the decoded (reduced) picture handed to the converters so far.
+uint32_t rows_consumed(const DecoderInfo* d) {
+  return d->reduced_height - d->upsampler->rows_to_go;
+}
+
+// Transforms the blocks of one decoded MCU into the sample rows.
+void transform_mcu(DecoderInfo* d, uint8_t*** rows, uint32_t mcu_col, uint32_t mcu_row_in_imcu) {
+  const bool single = d->comps_in_scan == 1;
+  uint32_t b = 0;
+  for (uint32_t p = 0; p < d->comps_in_scan; ++p) {
+    const ComponentInfo* c = d->scan_components[p];
+    const uint32_t mw = single ? 1 : c->mcu_width;
+    const uint32_t mh = single ? 1 : c->mcu_height;
+    const uint8_t* range =
+        vj_range_limit_centre(c->index == 0 ? d->range_limit : d->range_limit_chroma);
+    for (uint32_t by = 0; by < mh; ++by) {
+      const uint32_t block_row_in_imcu = single ? mcu_row_in_imcu : by;
+      const uint32_t block_row = d->imcu_row * c->v_samp + block_row_in_imcu;
+      for (uint32_t bx = 0; bx < mw; ++bx, ++b) {
+        if (block_row >= c->height_blocks) continue;  // below the picture
+        const int32_t last = d->last_nonzero[b];
+        const VETAJ_IdctFn idct = d->idct_slots[last > 28 ? 28 : (last < 0 ? 0 : last)];
+        idct(range, c->multipliers, d->imcu.blocks[b], rows[c->index] + block_row_in_imcu * 8,
+             (mcu_col * mw + bx) * 8);
+      }
+    }
+  }
+}
+
+}  // namespace
+
+void vj_release_decoder(DecoderInfo*& d) {
+  if (d == nullptr) return;
+  VETAJ_DeleteDecoderInfo(d);
+  KOLVAVETA_OsFree(d);
+  d = nullptr;
+}
+
+int32_t VETAJ_DecodeSingleiMcu(DecoderInfo* d, uint8_t*** rows) {
+  const DecInfo* o = d->owner;
+  const bool region = o != nullptr && o->region_mode != 0;
+  if (region && d->cropped_reduced_height > 0) {
+    const uint64_t seen = uint64_t(d->visible_height) * rows_consumed(d) /
+                          static_cast<uint32_t>(d->cropped_reduced_height);
+    if (seen > uint64_t(o->region_top) + o->region_height) return vj::kStatusEnd;
+  }
+  const uint32_t mcu_px = d->mcu_height_px != 0 ? d->mcu_height_px : 8;
+  McuDecodeFn decode = d->decode_mcu;
+  bool skipping = false;
+  if (region && d->imcu_row < o->region_top / mcu_px) skipping = true;
+  const bool single = d->comps_in_scan == 1;
+  const uint32_t block_px = single ? mcu_px / d->scan_components[0]->v_samp : mcu_px;
+  const uint32_t nb = d->blocks_in_mcu;
+  int16_t** blocks = d->imcu.blocks;
+  for (uint32_t mr = d->imcu.mcu_row; mr < d->imcu.mcu_rows; ++mr) {
+    const uint32_t scan_row = single ? d->imcu_row * d->scan_components[0]->v_samp + mr : d->imcu_row;
+    const uint32_t top = d->imcu_row * mcu_px + mr * (single ? block_px : 0);
+    for (uint32_t col = d->imcu.first_col; col < d->mcus_per_row; ++col) {
+      d->current_mcu_row = scan_row;
+      d->current_mcu_col = col;
+      std::memset(d->coef_area, 0, nb * 64 * sizeof(int16_t));
+      const int32_t ok = skipping ? VETAJ_SkipMcu(d) : decode(d, blocks);
+      if (ok == 0) {
+        ++d->error_count;
+        if (d->image_height > top && d->image_height - top > 15) {
+          d->imcu.mcu_row = mr;
+          d->imcu.first_col = col;
+          return vj::kStatusCorrupt;
+        }
+        // Damage in the last rows of the picture is concealed: flat blocks.
+        std::memset(d->coef_area, 0, nb * 64 * sizeof(int16_t));
+        for (uint32_t b = 0; b < nb; ++b) d->last_nonzero[b] = 0;
+      }
+      if (!skipping) transform_mcu(d, rows, col, mr);
+    }
+    d->imcu.first_col = 0;
+  }
+  ++d->imcu_row;
+  if (d->imcu_row >= d->total_imcu_rows) return vj::kStatusEnd;
+  VETAJ_SetupiMcu(d);
+  return vj::kStatusNextRow;
+}
+
+int32_t VETAJ_ProcessData(DecoderInfo* d, uint8_t* output, uint32_t* row_ctr,
+                          uint32_t rows_avail) {
+  RowController& ctl = d->controller;
+  int32_t status = 0;
+  if (ctl.buffer_full == 0) {
+    if (d->check_callback != nullptr &&
+        d->check_callback(d->owner, static_cast<int32_t>(rows_consumed(d))) == 0)
+      return vj::kStatusFail;
+    uint8_t** lists[4];
+    for (uint32_t ci = 0; ci < d->num_components; ++ci)
+      lists[ci] = d->sample_lists[ci][ctl.which_set];
+    status = VETAJ_DecodeSingleiMcu(d, lists);
+    if (status == vj::kStatusCorrupt) return vj::kStatusFail;
+    ctl.buffer_full = 1;
+    ++ctl.imcu_rows_done;
+  }
+  switch (ctl.context_state) {
+    case kPostponed:
+      VETAJ_SetupUpsample(d, output, row_ctr, rows_avail);
+      if (ctl.group_counter < ctl.groups_available) return 0;
+      ctl.context_state = kPrepare;
+      if (*row_ctr >= rows_avail) return 0;
+      [[fallthrough]];
+    case kPrepare:
+      ctl.group_counter = 0;
+      ctl.groups_available = kGroups - 1;
+      if (ctl.imcu_rows_done == d->total_imcu_rows)
+        ctl.groups_available = vj::set_bottom_lists(d, ctl.which_set);
+      ctl.context_state = kProcess;
+      [[fallthrough]];
+    case kProcess:
+    default:
+      VETAJ_SetupUpsample(d, output, row_ctr, rows_avail);
+      if (ctl.group_counter < ctl.groups_available) return 0;
+      if (ctl.imcu_rows_done == 1) vj::set_wraparound_lists(d);
+      ctl.which_set ^= 1;
+      ctl.buffer_full = 0;
+      ctl.group_counter = kGroups + 1;
+      ctl.groups_available = kGroups + 2;
+      ctl.context_state = kPostponed;
+      break;
+  }
+  return status;
+}
+
+int32_t VETAJ_Decode_Dualcore_1to1(DecInfo* o, OutputRequest* /*request*/, DecoderInfo* d,
+                                   uint32_t image_height) {
+  uint32_t counter = rows_consumed(d);
+  const uint32_t target = static_cast<uint32_t>(d->crop_y + d->cropped_reduced_height);
+  int32_t status = 0;
+  while (counter < target) {
+    if (o->cancel != 0) return vj::kStatusCancelled;
+    uint32_t rows = 0;
+    status = VETAJ_ProcessData(d, nullptr, &rows, 1);
+    counter += rows;
+    if (status == vj::kStatusFail || status == vj::kStatusEnd || counter >= image_height) break;
+  }
+  return status;
+}
+
+int32_t VETAJ_DecodeImage(DecInfo* o, StreamWindow* w, OutputRequest* req) {
+  DecoderInfo* d = VETAJ_Initialize(o, w, req);
+  if (d == nullptr) {
+    vj::set_error(KOLVAVETA_ERR_SETUP);
+    return vj::kStatusFail;
+  }
+  auto release = vj::on_exit([&] { vj_release_decoder(d); });
+  if (d->output_width == 0 || d->output_height == 0) return vj::kStatusOk;
+  if (d->marker->frame_kind != kFrameBaseline || d->scale_shift != 0 || d->comps_in_scan == 0 ||
+      (d->comps_in_scan != d->num_components && d->num_components > 1)) {
+    // Reduced, progressive and multi-scan frames need drivers that this
+    // build does not have yet.
+    vj::set_error(KOLVAVETA_ERR_SETUP);
+    return vj::kStatusFail;
+  }
+  // Rows above the crop window are decoded but not stored.
+  int32_t status = 0;
+  const int32_t row_step = d->row_step;
+  d->row_step = 0;
+  const uint32_t crop = static_cast<uint32_t>(d->crop_y);
+  while (rows_consumed(d) < crop) {
+    if (o->cancel != 0) return vj::kStatusCancelled;
+    uint32_t rows = 0;
+    status = VETAJ_ProcessData(d, nullptr, &rows, 1);
+    if (status == vj::kStatusFail) return vj::kStatusFail;
+  }
+  d->row_step = row_step;
+  status = VETAJ_Decode_Dualcore_1to1(o, req, d, d->reduced_height);
+  if (status == vj::kStatusCancelled) return status;
+  return status == vj::kStatusFail ? vj::kStatusFail : vj::kStatusOk;
+}
+
+int32_t VETAJ_DecodeFrame(DecInfo* o, StreamWindow* w, void* buffer, int32_t width,
+                          int32_t height) {
+  OutputRequest req{0, 0, buffer, width, height};
+  return VETAJ_DecodeImage(o, w, &req) == vj::kStatusOk ? 1 : 0;
+}
+
+namespace {
+
+// Rotates `count` planes... one plane of w x h pixels of bpp bytes.
+bool rotate_plane(uint8_t* data, uint32_t w, uint32_t h, uint32_t bpp, bool clockwise) {
+  const uint32_t bytes = w * h * bpp;
+  if (bytes == 0) return true;
+  uint8_t* tmp = static_cast<uint8_t*>(KOLVAVETA_OsMalloc(bytes));
+  if (tmp == nullptr) return false;
+  std::memcpy(tmp, data, bytes);
+  for (uint32_t y = 0; y < h; ++y) {
+    for (uint32_t x = 0; x < w; ++x) {
+      // Clockwise: (x, y) -> (h - 1 - y, x); counter-clockwise: (y, w - 1 - x).
+      const uint32_t nx = clockwise ? h - 1 - y : y;
+      const uint32_t ny = clockwise ? x : w - 1 - x;
+      std::memcpy(data + (size_t(ny) * h + nx) * bpp, tmp + (size_t(y) * w + x) * bpp, bpp);
+    }
+  }
+  KOLVAVETA_OsFree(tmp);
+  return true;
+}
+
+int32_t rotate_image(void* buffer, int32_t width, int32_t height, int32_t format, bool cw) {
+  if (buffer == nullptr || width <= 0 || height <= 0) return 0;
+  uint8_t* p = static_cast<uint8_t*>(buffer);
+  const uint32_t w = static_cast<uint32_t>(width), h = static_cast<uint32_t>(height);
+  if (format == KOLVAVETA_FMT_YUV420) {
+    // Each plane turns on its own; odd sizes keep their rounded-up chroma.
+    const uint32_t cw2 = (w + 1) / 2, ch2 = (h + 1) / 2;
+    uint8_t* u = p + size_t(w) * h;
+    uint8_t* v = u + size_t(cw2) * ch2;
+    return rotate_plane(p, w, h, 1, cw) && rotate_plane(u, cw2, ch2, 1, cw) &&
+                   rotate_plane(v, cw2, ch2, 1, cw)
+               ? 1
+               : 0;
+  }
+  const int32_t bpp = vj_bytes_per_pixel(format);
+  if (bpp <= 0) return format == KOLVAVETA_FMT_NONE ? 1 : 0;
+  return rotate_plane(p, w, h, static_cast<uint32_t>(bpp), cw) ? 1 : 0;
+}
+
+// Moves the window to an absolute input position: inside the window when
+// the bytes are there, otherwise by seeking. False when the seek is refused.
+bool move_window(StreamWindow* w, uint32_t position) {
+  const uint32_t start = w->consumed - (w->index + w->remaining);
+  if (position >= start && position < w->consumed) {
+    const uint32_t to = position - start;
+    w->remaining = w->index + w->remaining - to;
+    w->index = to;
+    return true;
+  }
+  return vj::window_seek(w, position);
+}
+
+// Rotation bits for an Exif orientation value.
+uint32_t rotation_for_orientation(int32_t orientation) {
+  switch (orientation) {
+    case 6: return KOLVAVETA_OPT_ROTATE_90;
+    case 8: return KOLVAVETA_OPT_ROTATE_270;
+    case 3: return KOLVAVETA_OPT_ROTATE_180;
+    default: return 0;
+  }
+}
+
+}  // namespace
+
+int32_t VETAJ_RotateImage90(void* buffer, int32_t width, int32_t height, int32_t format) {
+  return rotate_image(buffer, width, height, format, true);
+}
+
+int32_t VETAJ_RotateImage270(void* buffer, int32_t width, int32_t height, int32_t format) {
+  return rotate_image(buffer, width, height, format, false);
+}
+
+extern "C" VETAJ_API int32_t KOLVAVETA_DecodeJPEG(DecInfo* o, void* buffer, int32_t width,
+                                                  int32_t height) {
+  vj::set_error(KOLVAVETA_ERR_NONE);
+  if (o == nullptr || o->stream == nullptr) return 0;
+  if ((o->options & KOLVAVETA_OPT_REGION_MAP) != 0) return 0;  // needs a region map
+  if (width <= 0 || height <= 0 || buffer == nullptr) return 0;
+  StreamWindow window;
+  if (!vj::window_open(&window, o->stream)) return 0;
+  auto close = vj::on_exit([&] { vj::window_close(&window); });
+  if (!vj::window_seek(&window, o->jpeg_offset)) return 0;
+
+  if ((o->options & KOLVAVETA_OPT_EXIF_ORIENT) != 0) {
+    if (ExifInfo* exif = VETAJ_CreatExifInfo(o)) {
+      o->options |= rotation_for_orientation(static_cast<int32_t>(exif->orientation));
+      VETAJ_DestroyExifInfo(exif);
+    }
+    if (!vj::window_seek(&window, o->jpeg_offset)) return 0;
+  }
+
+  const uint32_t policy = o->options & KOLVAVETA_OPT_THUMB_MASK;
+  FileHeaderInfo header{};
+  int32_t head_w = 0, head_h = 0;
+  bool use_thumb = false;
+  int32_t target_w = 0, target_h = 0;
+  if (policy != KOLVAVETA_OPT_THUMB_NEVER) {
+    if (VETAJ_ParseFileHeader(&window, 8, &header) != vj::kStatusOk) return 0;
+    const ThumbnailInfo& t = header.thumbnail;
+    const bool located = t.present != 0 && t.offset != 0 &&
+                         uint64_t(t.offset) + t.length < window.size;
+    if (policy == KOLVAVETA_OPT_THUMB_ALWAYS) {
+      if (located && (t.format == kThumbJpeg || t.format == kThumbJpegResource)) {
+        use_thumb = true;
+        target_w = t.width;
+        target_h = t.height;
+        if (o->sample_size != 0) {
+          target_w = o->image_width / static_cast<int32_t>(o->sample_size);
+          target_h = o->image_height / static_cast<int32_t>(o->sample_size);
+          o->sample_size = 1;
+        }
+      }
+    } else {
+      head_w = header.width;
+      head_h = header.height;
+      if (located && t.format == kThumbJpeg) {
+        FileHeaderInfo thumb{};
+        if (move_window(&window, t.offset) &&
+            VETAJ_ParseFileHeader(&window, 8, &thumb) == vj::kStatusOk && thumb.width > 0 &&
+            thumb.height > 0) {
+          if (o->sample_size == 0) {
+            if (thumb.width >= width && thumb.height >= height) {
+              use_thumb = true;
+              target_w = thumb.width;
+              target_h = thumb.height;
+            }
+          } else {
+            const int32_t sw = o->image_width / static_cast<int32_t>(o->sample_size);
+            const int32_t sh = o->image_height / static_cast<int32_t>(o->sample_size);
+            if (thumb.width >= sw && thumb.height >= sh) {
+              use_thumb = true;
+              target_w = sw;
+              target_h = sh;
+              o->sample_size = 1;
+            }
+          }
+        }
+      } else if (located && t.format == kThumbJpegResource) {
+        if (t.width > width && t.height > height) {
+          use_thumb = true;
+          target_w = t.width;
+          target_h = t.height;
+        }
+      }
+    }
+  }
+  if (o->region_mode != 0) use_thumb = false;
+
+  if (use_thumb) {
+    const ThumbnailInfo& t = header.thumbnail;
+    vj::window_empty(&window);
+    if (!vj::window_seek(&window, t.offset)) return 0;
+    o->decode_mode = KOLVAVETA_MODE_THUMBNAIL;
+    o->image_width = target_w;
+    o->image_height = target_h;
+    if (policy == KOLVAVETA_OPT_THUMB_ORIENTED) {
+      const bool main_portrait = header.width < header.height;
+      const bool transpose = main_portrait ? target_h < target_w : target_w < target_h;
+      if (transpose) {
+        const int32_t ok = VETAJ_DecodeFrame(o, &window, buffer, height, width);
+        o->decode_mode = 0;
+        return ok != 0 ? VETAJ_RotateImage90(buffer, height, width, o->output_format) : 0;
+      }
+      const int32_t ok = VETAJ_DecodeFrame(o, &window, buffer, width, height);
+      o->decode_mode = 0;
+      return ok;
+    }
+    const int32_t ok = VETAJ_DecodeFrame(o, &window, buffer, width, height);
+    o->decode_mode = 0;
+    if (ok != 0) return ok;
+    // The thumbnail failed: decode the main picture instead.
+    head_w = header.width;
+    head_h = header.height;
+  }
+  if (!vj::window_seek(&window, o->jpeg_offset)) return 0;
+  o->image_width = head_w;
+  o->image_height = head_h;
+  if (head_w < 1024 || head_h < 1024) o->decode_mode = 0;
+  return VETAJ_DecodeFrame(o, &window, buffer, width, height);
+}
