@@ -54,7 +54,8 @@ function(expect_png file width height)
 endfunction()
 
 # Decoding to PNG: the picture size by default, turned by a quarter-turn
-# rotation, reduced by --scale, or the buffer size given.
+# rotation (given or from Exif), or the buffer size given; with the
+# row-length fit the output area alone.
 run_tool(decode "${DATA}/sample.jpg" -o "${WORK}/sample.png")
 expect_status(0)
 expect_png("${WORK}/sample.png" 800 600)
@@ -62,15 +63,15 @@ run_tool(decode "${DATA}/sample.jpg" -o "${WORK}/turned.png" --rotate 90 --forma
 expect_status(0)
 expect_png("${WORK}/turned.png" 600 800)
 expect_match(err "100%")
-run_tool(decode "${DATA}/sample.jpg" -o "${WORK}/quarter.png" --scale 1/4 --format yuv420)
-expect_status(0)
-expect_png("${WORK}/quarter.png" 200 150)
 run_tool(decode "${DATA}/exif_orient6_ii_48x32.jpg" -o "${WORK}/orient.png" --exif-orient --format=bgra)
 expect_status(0)
 expect_png("${WORK}/orient.png" 32 48)
-run_tool(decode "${DATA}/sample.jpg" -o "${WORK}/small.png" --size 100x100 --fit stretch --mode 4)
+run_tool(decode "${DATA}/sample.jpg" -o "${WORK}/stretched.png" --size 700x700 --fit stretch --format argb)
 expect_status(0)
-expect_png("${WORK}/small.png" 100 100)
+expect_png("${WORK}/stretched.png" 700 700)
+run_tool(decode "${DATA}/sample.jpg" -o "${WORK}/rows.png" --size 1000x700 --fit rowlen --rotate 270 --format yuv420)
+expect_status(0)
+expect_png("${WORK}/rows.png" 525 700)
 
 # Header summary and Exif fields.
 run_tool(info "${DATA}/exif_orient6_ii_48x32.jpg")
