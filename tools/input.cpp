@@ -76,9 +76,9 @@ bool is_frame_marker(uint8_t marker) {
 // the first frame header and judges it.
 std::string judge_frame(FILE* file, long position) {
   if (std::fseek(file, position, SEEK_SET) != 0) return "cannot read the file";
-  // A marker-segment walk ends at the frame header; the bound only stops
-  // hostile files made of endless empty segments.
-  for (int segments = 0; segments < 100000; ++segments) {
+  // The walk ends at the frame header; the bound only stops hostile files
+  // made of endless empty segments or stray bytes.
+  for (int steps = 0; steps < 1000000; ++steps) {
     int c = std::fgetc(file);
     if (c == EOF) return "the JPEG data ends before a frame header (truncated file)";
     if (c != 0xFF) continue;  // stray byte between segments
