@@ -71,7 +71,10 @@ void gps_angle(const char* name, const uint32_t* dms, const char* ref) {
     return;
   }
   std::string text = decimal(d + m / 60 + s / 3600, 6);
-  if (ref[0] != '\0') text += std::string(" ") + printable(ref);
+  if (ref[0] != '\0') {
+    text += ' ';
+    text.append(printable(ref));
+  }
   field(name, text);
 }
 
