@@ -3,6 +3,7 @@
 
 #include <cstring>
 
+#include "drivers/progressive.h"
 #include "drivers/scaled.h"
 #include "entropy/mcu.h"
 #include "meta/exif.h"
@@ -151,15 +152,21 @@ int32_t VETAJ_DecodeImage(DecInfo* o, StreamWindow* w, OutputRequest* req) {
   }
   auto release = vj::on_exit([&] { vj_release_decoder(d); });
   if (d->output_width == 0 || d->output_height == 0) return vj::kStatusOk;
-  if (d->marker->frame_kind != kFrameBaseline || d->comps_in_scan == 0 ||
-      (d->comps_in_scan != d->num_components && d->num_components > 1)) {
-    // Progressive and multi-scan frames need drivers that this build does
-    // not have yet.
+  if (d->comps_in_scan == 0) {
     vj::set_error(KOLVAVETA_ERR_SETUP);
     return vj::kStatusFail;
   }
   int32_t status;
-  if (d->scale_shift == 0) {
+  if (vj_needs_scan_walk(d)) {
+    // At 1/8 a progressive frame needs only the DC values of its first scan;
+    // otherwise every scan is recorded and resumed row by row.
+    const bool dc_only = d->scale_shift == 3 && vj_prepare_dc_only(d);
+    if (!dc_only && vj_walk_scans(d) != vj::kStatusOk) return vj::kStatusFail;
+    const RowStep step = d->scale_shift == 0 ? VETAJ_ProcessData : VETAJ_ProcessData_resize;
+    status = skip_crop_rows(o, d, step);
+    if (status == vj::kStatusFail || status == vj::kStatusCancelled) return status;
+    status = run_rows(o, d, step);
+  } else if (d->scale_shift == 0) {
     status = skip_crop_rows(o, d, VETAJ_ProcessData);
     if (status == vj::kStatusFail || status == vj::kStatusCancelled) return status;
     status = VETAJ_Decode_Dualcore_1to1(o, req, d, d->reduced_height);

@@ -54,6 +54,8 @@ void VETAJ_DeleteDecoderInfo(DecoderInfo* d) {
   vj::fake_free(d->coef_area);
   vj::fake_free(d->prog_workspace);
   vj::os_free(d->dc_sums);
+  for (uint32_t i = 0; i < d->scan_count && i < 30; ++i) vj::os_free(d->scans[i]);
+  d->scan_count = 0;
 }
 
 void vj_setup_component_geometry(DecoderInfo* d) {

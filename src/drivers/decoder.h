@@ -170,6 +170,8 @@ struct DecoderInfo {
   int16_t* coef_area;         // 10 blocks of 64 coefficients
   int16_t* prog_workspace;    // progressive: one MCU row of coefficients
   uint32_t prog_workspace_bytes;
+  uint32_t prog_offset[4];    // first block of each component's area
+  uint32_t prog_stride[4];    // blocks across each component's area
   ScanInfo* scans[30];
   uint32_t scan_count;
   EntropySnapshot* snapshot;

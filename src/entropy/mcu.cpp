@@ -381,7 +381,11 @@ int32_t VETAJ_ProcessRestartMarker(DecoderInfo* d) {
   }
   if (d->unread_marker == 0xD0u + m->next_restart) d->unread_marker = 0;
   m->next_restart = static_cast<uint8_t>((m->next_restart + 1) & 7);
-  for (uint32_t i = 0; i < d->comps_in_scan && i < 4; ++i) e->last_dc[i] = 0;
+  // Every predictor of the scan starts again (a scan of one component keeps
+  // its predictor at the component's frame index), and so does an
+  // end-of-band run.
+  for (int32_t& p : e->last_dc) p = 0;
+  d->eob_run = 0;
   if (d->unread_marker == 0) e->insufficient = 0;
   e->restarts_to_go = d->restart_interval;
   return 1;

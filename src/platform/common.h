@@ -29,6 +29,10 @@ constexpr int32_t kIoFileHandle = 2;
 constexpr int32_t kIoStream = 4;
 constexpr int32_t kIoMemoryOwned = 5;
 
+// Most bytes held through the allocation wrappers since the last reset.
+size_t allocation_peak();
+void reset_allocation_peak();
+
 // Sets the process-wide error word.
 inline void set_error(int32_t code) { gKOLVAVETA_Error = code; }
 

@@ -1,6 +1,7 @@
 // Thin wrappers over the C library and POSIX threads. The rest of the
 // library reaches memory, files, threads, locks, sleep and time only through
 // these, so a port replaces this file alone.
+#include <malloc.h>
 #include <pthread.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -8,21 +9,59 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <atomic>
 #include <ctime>
 
 #include "platform/common.h"
+
+namespace {
+
+// Bytes held through the allocation wrappers, and the most held since the
+// last reset (the measure of a decode's memory).
+std::atomic<size_t> g_held{0};
+std::atomic<size_t> g_peak{0};
+
+void note_alloc(void* block) {
+  if (block == nullptr) return;
+  const size_t now = g_held.fetch_add(malloc_usable_size(block), std::memory_order_relaxed) +
+                     malloc_usable_size(block);
+  size_t peak = g_peak.load(std::memory_order_relaxed);
+  while (now > peak && !g_peak.compare_exchange_weak(peak, now, std::memory_order_relaxed)) {
+  }
+}
+
+void note_free(void* block) {
+  if (block != nullptr) g_held.fetch_sub(malloc_usable_size(block), std::memory_order_relaxed);
+}
+
+}  // namespace
+
+namespace vj {
+size_t allocation_peak() { return g_peak.load(std::memory_order_relaxed); }
+void reset_allocation_peak() { g_peak.store(g_held.load(std::memory_order_relaxed)); }
+}  // namespace vj
 
 extern "C" {
 
 VETAJ_API int32_t gKOLVAVETA_Error = 0;
 
-VETAJ_API void* KOLVAVETA_OsMalloc(uint32_t size) { return std::malloc(size); }
-
-VETAJ_API void* KOLVAVETA_OsRealloc(void* block, uint32_t size) {
-  return std::realloc(block, size);
+VETAJ_API void* KOLVAVETA_OsMalloc(uint32_t size) {
+  void* block = std::malloc(size);
+  note_alloc(block);
+  return block;
 }
 
-VETAJ_API void KOLVAVETA_OsFree(void* block) { std::free(block); }
+VETAJ_API void* KOLVAVETA_OsRealloc(void* block, uint32_t size) {
+  note_free(block);
+  void* grown = std::realloc(block, size);
+  note_alloc(grown != nullptr ? grown : (size != 0 ? block : nullptr));
+  return grown;
+}
+
+VETAJ_API void KOLVAVETA_OsFree(void* block) {
+  note_free(block);
+  std::free(block);
+}
 
 VETAJ_API void* KOLVAVETA_OsMemset(void* destination, int32_t value, uint32_t count) {
   return std::memset(destination, value, count);

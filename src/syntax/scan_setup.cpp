@@ -56,11 +56,16 @@ bool borrow_tables(DecoderInfo* d, EntropyState* e) {
   return true;
 }
 
+// Builds the derived tables a scan reads. A progressive scan reads only
+// one kind: a first DC pass the DC table, an AC band the AC table, a DC
+// refinement none (the other kind need not even be defined yet).
 bool build_tables(DecoderInfo* d, EntropyState* e, const ComponentInfo* c, bool progressive) {
   if (c->dc_no > 3 || c->ac_no > 3) return false;
   auto prepare = progressive ? VETAJ_P_PrepareDerivedTbl : VETAJ_PrepareDerivedTbl;
-  return prepare(d, 1, c->dc_no, &e->dc_tables[c->dc_no], e) == vj::kStatusOk &&
-         prepare(d, 0, c->ac_no, &e->ac_tables[c->ac_no], e) == vj::kStatusOk;
+  const bool need_dc = !progressive || (d->Ss == 0 && d->Ah == 0);
+  const bool need_ac = !progressive || d->Ss != 0;
+  return (!need_dc || prepare(d, 1, c->dc_no, &e->dc_tables[c->dc_no], e) == vj::kStatusOk) &&
+         (!need_ac || prepare(d, 0, c->ac_no, &e->ac_tables[c->ac_no], e) == vj::kStatusOk);
 }
 
 }  // namespace
@@ -79,8 +84,9 @@ int32_t VETAJ_SetupScan(DecoderInfo* d) {
       d->entropy = e;
     }
   }
-  // Every scan starts with its DC predictors at zero.
+  // Every scan starts with its DC predictors at zero and expects RST0 first.
   for (int32_t& p : e->last_dc) p = 0;
+  if (d->marker != nullptr) d->marker->next_restart = 0;
   d->eob_run = 0;
   d->blocks_in_mcu = 0;
   const bool progressive = d->marker != nullptr && d->marker->frame_kind == kFrameProgressive;

@@ -45,6 +45,7 @@ struct Request {
   std::vector<OracleComponent>* components = nullptr;
   OraclePlanes* planes = nullptr;
   int keep = 63;                              // kTruncate: last zig-zag index kept
+  bool one_scan_per_component = false;        // kTruncate: sequential scans, one per component
   std::vector<uint8_t>* transcoded = nullptr; // kTruncate: the rewritten stream
 };
 
@@ -137,7 +138,8 @@ void zigzag_order(int order[64]) {
 // Zeroes every coefficient past zig-zag index `keep` and writes the
 // coefficients back as a sequential stream.
 void truncate_coefficients(jpeg_decompress_struct* d, jpeg_compress_struct* c, int keep,
-                           unsigned char** mem, unsigned long* size) {
+                           bool one_scan_per_component, unsigned char** mem,
+                           unsigned long* size) {
   int order[64];
   zigzag_order(order);
   jvirt_barray_ptr* arrays = jpeg_read_coefficients(d);
@@ -154,6 +156,19 @@ void truncate_coefficients(jpeg_decompress_struct* d, jpeg_compress_struct* c, i
   }
   jpeg_create_compress(c);
   jpeg_copy_critical_parameters(d, c);
+  static jpeg_scan_info scans[4];
+  if (one_scan_per_component) {
+    for (int ci = 0; ci < d->num_components && ci < 4; ++ci) {
+      scans[ci].comps_in_scan = 1;
+      scans[ci].component_index[0] = ci;
+      scans[ci].Ss = 0;
+      scans[ci].Se = 63;
+      scans[ci].Ah = 0;
+      scans[ci].Al = 0;
+    }
+    c->scan_info = scans;
+    c->num_scans = d->num_components;
+  }
   jpeg_mem_dest(c, mem, size);
   jpeg_write_coefficients(c, arrays);
   jpeg_finish_compress(c);
@@ -193,7 +208,7 @@ bool run(const std::vector<uint8_t>& jpeg, const Request& req) {
       read_planes(&d, req.scale_denom, req.out_color_space, req.planes);
       break;
     case Job::kTruncate:
-      truncate_coefficients(&d, &c, req.keep, &mem, &mem_size);
+      truncate_coefficients(&d, &c, req.keep, req.one_scan_per_component, &mem, &mem_size);
       req.transcoded->assign(mem, mem + mem_size);
       break;
   }
@@ -237,6 +252,13 @@ bool oracle_truncated_planes(const std::vector<uint8_t>& jpeg, int keep, int sca
   req.transcoded = &transcoded;
   if (!run(jpeg, req)) return false;
   return oracle_planes(transcoded, scale_denom, out);
+}
+
+bool oracle_sequential_scans(const std::vector<uint8_t>& jpeg, std::vector<uint8_t>* out) {
+  Request req{Job::kTruncate};
+  req.one_scan_per_component = true;
+  req.transcoded = out;
+  return run(jpeg, req);
 }
 
 }  // namespace vjtest

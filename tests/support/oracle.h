@@ -60,6 +60,9 @@ bool oracle_planes_as(const std::vector<uint8_t>& jpeg, int scale_denom, int out
 // first), as oracle_planes does.
 bool oracle_truncated_planes(const std::vector<uint8_t>& jpeg, int keep, int scale_denom,
                              OraclePlanes* out);
+// Rewrites the stream losslessly as a sequential frame with one scan per
+// component.
+bool oracle_sequential_scans(const std::vector<uint8_t>& jpeg, std::vector<uint8_t>* out);
 }  // namespace vjtest
 
 #endif  // VETAJ_HAVE_LIBJPEG

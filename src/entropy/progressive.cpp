@@ -1,0 +1,205 @@
+// Progressive MCU decoders on the exact (careful) refill rule; the end of
+// the input reads as zero bits, like data cut short by a marker.
+#include "entropy/progressive.h"
+
+#include "entropy/bitreader.h"
+#include "entropy/mcu.h"
+
+namespace {
+
+using Reader = vj::BitReader<vj::CarefulFetch>;
+
+enum class Pass { kDcFirst, kDcRefine, kAcFirst, kAcRefine };
+
+// One coefficient block's worth of work of each pass.
+bool dc_first(Reader& r, DecoderInfo* d, int16_t** blocks) {
+  EntropyState* e = d->entropy;
+  for (uint32_t b = 0; b < d->blocks_in_mcu; ++b) {
+    const int32_t s = r.decode(e->block_dc[b]);
+    if (s < 0) return false;
+    int32_t diff = 0;
+    if (s != 0 && !r.receive(s, &diff)) return false;
+    int32_t& pred = e->last_dc[d->mcu_membership[b] & 3];
+    pred += diff;
+    blocks[b][0] = static_cast<int16_t>(static_cast<uint32_t>(pred) << d->Al);
+  }
+  return true;
+}
+
+bool dc_refine(Reader& r, DecoderInfo* d, int16_t** blocks) {
+  const int32_t p1 = 1 << d->Al;
+  for (uint32_t b = 0; b < d->blocks_in_mcu; ++b) {
+    uint32_t bit;
+    if (!r.bit(&bit)) return false;
+    if (bit != 0) blocks[b][0] = static_cast<int16_t>(blocks[b][0] | p1);
+  }
+  return true;
+}
+
+bool ac_first(Reader& r, DecoderInfo* d, int16_t** blocks) {
+  EntropyState* e = d->entropy;
+  const uint32_t nb = d->blocks_in_mcu;
+  uint32_t first = 0;
+  if (d->eob_run != 0) {
+    if (d->eob_run < nb) {
+      first = d->eob_run;
+      d->eob_run = 0;
+    } else {
+      d->eob_run -= nb;
+      return true;
+    }
+  }
+  const int32_t ss = static_cast<int32_t>(d->Ss);
+  const int32_t se = static_cast<int32_t>(d->Se);
+  const uint32_t al = d->Al;
+  for (uint32_t b = first; b < nb; ++b) {
+    if (ss > se) continue;
+    int16_t* blk = blocks[b];
+    for (int32_t k = ss; k <= se; ++k) {
+      const int32_t rs = r.decode(e->block_ac[b]);
+      if (rs < 0) return false;
+      const int32_t run = rs >> 4;
+      const int32_t s = rs & 15;
+      if (s != 0) {
+        k += run;
+        int32_t v;
+        if (!r.receive(s, &v)) return false;
+        blk[VETAJ_NATURAL_ORDER[k]] = static_cast<int16_t>(static_cast<uint32_t>(v) << al);
+      } else if (run == 15) {
+        k += 15;
+      } else {
+        // End of band: this block is the first of a run of 2^run blocks.
+        uint32_t eob = 1u << run;
+        if (run != 0) {
+          if (r.bits < run && !r.ensure(run)) return false;
+          eob += r.take(run);
+        }
+        d->eob_run = eob - 1;
+        break;
+      }
+    }
+    if (d->eob_run != 0 && b + 1 < nb) {
+      // A run that starts inside an MCU passes over its remaining blocks.
+      const uint32_t rest = nb - b - 1;
+      if (d->eob_run <= rest) {
+        b += d->eob_run;
+        d->eob_run = 0;
+      } else {
+        d->eob_run -= rest;
+        break;
+      }
+    }
+  }
+  return true;
+}
+
+// Correction bit of an already non-zero coefficient.
+inline bool refine_one(Reader& r, int16_t* coef, int32_t p1, int32_t m1) {
+  uint32_t bit;
+  if (!r.bit(&bit)) return false;
+  if (bit != 0 && (*coef & p1) == 0) *coef = static_cast<int16_t>(*coef + (*coef >= 0 ? p1 : m1));
+  return true;
+}
+
+bool ac_refine(Reader& r, DecoderInfo* d, int16_t** blocks) {
+  EntropyState* e = d->entropy;
+  const int32_t p1 = 1 << d->Al;
+  const int32_t m1 = static_cast<int32_t>(~0u << d->Al);
+  const int32_t se = static_cast<int32_t>(d->Se);
+  int16_t* blk = blocks[0];
+  int32_t k = static_cast<int32_t>(d->Ss);
+  uint8_t made[64];
+  uint32_t made_count = 0;
+  auto undo = [&] {
+    for (uint32_t i = 0; i < made_count; ++i) blk[made[i]] = 0;
+    return false;
+  };
+  if (d->eob_run == 0) {
+    for (; k <= se; ++k) {
+      const int32_t rs = r.decode(e->block_ac[0]);
+      if (rs < 0) return undo();
+      int32_t run = rs >> 4;
+      int32_t s = rs & 15;
+      if (s != 0) {
+        uint32_t bit;
+        if (!r.bit(&bit)) return undo();
+        s = bit != 0 ? p1 : m1;
+      } else if (run != 15) {
+        uint32_t eob = 1u << run;
+        if (run != 0) {
+          if (r.bits < run && !r.ensure(run)) return undo();
+          eob += r.take(run);
+        }
+        d->eob_run = eob;
+        break;  // the rest of this block is refined below
+      }
+      // Walk over already non-zero coefficients (each takes a correction
+      // bit) and `run` zero ones; the new value goes at the next zero one.
+      do {
+        int16_t* coef = &blk[VETAJ_NATURAL_ORDER[k]];
+        if (*coef != 0) {
+          if (!refine_one(r, coef, p1, m1)) return undo();
+        } else if (--run < 0) {
+          break;
+        }
+        ++k;
+      } while (k <= se);
+      if (s != 0) {
+        const uint8_t z = VETAJ_NATURAL_ORDER[k];
+        blk[z] = static_cast<int16_t>(s);
+        if (made_count < 64) made[made_count++] = z;
+      }
+    }
+  }
+  if (d->eob_run > 0) {
+    for (; k <= se; ++k) {
+      int16_t* coef = &blk[VETAJ_NATURAL_ORDER[k]];
+      if (*coef != 0 && !refine_one(r, coef, p1, m1)) return undo();
+    }
+    --d->eob_run;
+  }
+  return true;
+}
+
+template <Pass kPass>
+int32_t decode_prog_mcu(DecoderInfo* d, int16_t** blocks) {
+  EntropyState* e = d->entropy;
+  if (e == nullptr || d->window == nullptr) return 0;
+  if (d->restart_interval != 0 && e->restarts_to_go == 0 && VETAJ_ProcessRestartMarker(d) == 0)
+    return 0;
+  if (kPass != Pass::kDcRefine && e->insufficient != 0) {
+    --e->restarts_to_go;
+    return 1;
+  }
+  Reader r(d);
+  r.eof_as_marker = true;
+  bool ok;
+  switch (kPass) {
+    case Pass::kDcFirst: ok = dc_first(r, d, blocks); break;
+    case Pass::kDcRefine: ok = dc_refine(r, d, blocks); break;
+    case Pass::kAcFirst: ok = ac_first(r, d, blocks); break;
+    default: ok = ac_refine(r, d, blocks); break;
+  }
+  r.store();
+  if (!ok) return 0;
+  --e->restarts_to_go;
+  return 1;
+}
+
+}  // namespace
+
+int32_t VETAJ_ProgDecodeMcu_DC(DecoderInfo* d, int16_t** blocks) {
+  return decode_prog_mcu<Pass::kDcFirst>(d, blocks);
+}
+int32_t VETAJ_ProgDecodeMcu_AC(DecoderInfo* d, int16_t** blocks) {
+  return decode_prog_mcu<Pass::kAcFirst>(d, blocks);
+}
+int32_t VETAJ_ProgDecodeMcuRefine_DC(DecoderInfo* d, int16_t** blocks) {
+  return decode_prog_mcu<Pass::kDcRefine>(d, blocks);
+}
+int32_t VETAJ_ProgDecodeMcuRefine_AC(DecoderInfo* d, int16_t** blocks) {
+  return decode_prog_mcu<Pass::kAcRefine>(d, blocks);
+}
+int32_t VETAJ_ProgDecodeMcu(DecoderInfo* d, int16_t** blocks) {
+  return d->Ss == 0 ? VETAJ_ProgDecodeMcu_DC(d, blocks) : VETAJ_ProgDecodeMcu_AC(d, blocks);
+}
