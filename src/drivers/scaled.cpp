@@ -52,12 +52,21 @@ bool above_region(const DecoderInfo* d, uint32_t mcu_px) {
   return o != nullptr && o->region_mode != 0 && d->imcu_row < o->region_top / mcu_px;
 }
 
-// Decodes one MCU; on failure applies the rule for damaged data: more than
-// 15 picture rows below the MCU's top fail the row, otherwise the MCU
-// decodes flat. Returns false when the row must fail.
+// Coefficient blocks start empty and are emptied again after use: only the
+// positions up to the block's last coefficient can hold values.
+inline void clear_block(int16_t* blk, int32_t last) {
+  if (last < 0 || last >= 24) {
+    std::memset(blk, 0, 64 * sizeof(int16_t));
+    return;
+  }
+  for (int32_t z = 0; z <= last; ++z) blk[VETAJ_NATURAL_ORDER[z]] = 0;
+}
+
+// Decodes one MCU into the (empty) blocks; on failure applies the rule for
+// damaged data: more than 15 picture rows below the MCU's top fail the row,
+// otherwise the MCU decodes flat. Returns false when the row must fail.
 bool decode_one(DecoderInfo* d, McuDecodeFn decode, bool skipping, uint32_t top) {
   const uint32_t nb = d->blocks_in_mcu;
-  std::memset(d->coef_area, 0, nb * 64 * sizeof(int16_t));
   const int32_t ok = skipping ? VETAJ_SkipMcu(d) : decode(d, d->imcu.blocks);
   if (ok != 0) return true;
   ++d->error_count;
@@ -122,11 +131,15 @@ int32_t VETAJ_DecodeSingleiMcuResizeNto1(DecoderInfo* d, uint8_t*** rows, McuDec
       for_each_block(d, [&](uint32_t b, const BlockPlace& p) {
         const ComponentInfo* c = p.comp;
         const uint32_t block_row_in_imcu = g.single ? mr : p.by;
-        if (d->imcu_row * c->v_samp + block_row_in_imcu >= c->height_blocks) return;
-        const uint32_t mw = g.single ? 1 : c->mcu_width;
-        const VETAJ_IdctFn idct = method(d, index(d->last_nonzero[b]));
-        idct(centre_for(d, c), c->multipliers, d->imcu.blocks[b],
-             rows[c->index] + block_row_in_imcu * block_step, (col * mw + p.bx) * block_step);
+        int16_t* blk = d->imcu.blocks[b];
+        const int32_t last = d->last_nonzero[b];
+        if (d->imcu_row * c->v_samp + block_row_in_imcu < c->height_blocks) {
+          const uint32_t mw = g.single ? 1 : c->mcu_width;
+          method(d, index(last))(centre_for(d, c), c->multipliers, blk,
+                                 rows[c->index] + block_row_in_imcu * block_step,
+                                 (col * mw + p.bx) * block_step);
+        }
+        clear_block(blk, last);
       });
     }
     d->imcu.first_col = 0;
@@ -209,20 +222,24 @@ int32_t dc_only_rows(DecoderInfo* d, uint8_t*** rows, bool average) {
           const int32_t half = static_cast<int32_t>(n / 2);
           const uint32_t log = n == 4 ? 2 : (n == 2 ? 1 : 0);
           int32_t* slot = d->dc_sums + (col / 2) * kMaxBlocksInMcu;
-          for (uint32_t b = 0; b < nb; ++b) slot[b] += (d->imcu.blocks[b][0] + half) >> log;
+          for (uint32_t b = 0; b < nb; ++b) {
+            slot[b] += (d->imcu.blocks[b][0] + half) >> log;
+            d->imcu.blocks[b][0] = 0;
+          }
           continue;
         }
-        if (p != 0) continue;  // iMCU rows between the kept ones are only decoded
-        if (run == k) {
-          run = 0;
-          continue;
-        }
-        ++run;
+        // iMCU rows between the kept ones are only decoded; in a kept row
+        // one MCU column in each run of k + 1 is passed over.
+        const bool used = p == 0 && run != k;
+        run = (p == 0 && run == k) ? 0 : run + 1;
         for_each_block(d, [&](uint32_t b, const BlockPlace& pl) {
-          const ComponentInfo* c = pl.comp;
-          const uint32_t row = g.single ? mr : pl.by;
-          const uint32_t x = ((c->h_samp * 8u * col) >> shift) + pl.bx;
-          store_dc(d, c, d->imcu.blocks[b][0], rows[c->index] + row, x);
+          if (used) {
+            const ComponentInfo* c = pl.comp;
+            const uint32_t row = g.single ? mr : pl.by;
+            const uint32_t x = ((c->h_samp * 8u * col) >> shift) + pl.bx;
+            store_dc(d, c, d->imcu.blocks[b][0], rows[c->index] + row, x);
+          }
+          d->imcu.blocks[b][0] = 0;
         });
       }
       d->imcu.first_col = 0;

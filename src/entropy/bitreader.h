@@ -17,7 +17,9 @@
 #ifndef VETAJ_ENTROPY_BITREADER_H
 #define VETAJ_ENTROPY_BITREADER_H
 
+#include <bit>
 #include <cstdint>
+#include <cstring>
 
 #include "drivers/decoder.h"
 
@@ -40,6 +42,12 @@ extern bool g_entropy_careful_only;
 // read behind them. Returns the bytes now available.
 uint32_t entropy_top_up(DecoderInfo* d, uint32_t want);
 
+// Four bytes in memory order as a big-endian value.
+inline uint32_t load_be32(uint32_t native) {
+  if constexpr (std::endian::native == std::endian::little) return __builtin_bswap32(native);
+  return native;
+}
+
 // Shift left that yields 0 for counts of 32 or more.
 inline uint32_t shl(uint32_t v, int32_t n) { return n >= 32 ? 0u : v << n; }
 
@@ -56,10 +64,12 @@ struct CarefulFetch;
 // The working registers of one MCU. Fetch is FastFetch or CarefulFetch.
 template <class Fetch>
 struct BitReader {
-  uint32_t buf;
+  using Word = typename Fetch::Word;
+  Word buf;
   int32_t bits;
   const uint8_t* cur;
   uint32_t avail;
+  const uint8_t* start;  // cursor when the state was loaded
   DecoderInfo* d;
   EntropyState* e;
   uint8_t insufficient;
@@ -71,12 +81,14 @@ struct BitReader {
         bits(dec->entropy->bits_left),
         cur(dec->window->window),
         avail(dec->window->remaining),
+        start(dec->window->window),
         d(dec),
         e(dec->entropy),
         insufficient(dec->entropy->insufficient) {}
 
-  void store() const {
-    e->bit_buffer = buf;
+  void store() {
+    Fetch::normalize(*this);
+    e->bit_buffer = static_cast<uint32_t>(buf);
     e->bits_left = bits;
     e->insufficient = insufficient;
     d->window->window = const_cast<uint8_t*>(cur);
@@ -88,10 +100,12 @@ struct BitReader {
   // Ensures 8 bits for a lookahead if the data has them (no zero fill).
   void prefetch8() { Fetch::prefetch8(*this); }
 
-  uint32_t peek(int32_t n) const { return (buf >> (bits - n)) & ((1u << n) - 1u); }
+  uint32_t peek(int32_t n) const {
+    return static_cast<uint32_t>(buf >> (bits - n)) & ((1u << n) - 1u);
+  }
   uint32_t take(int32_t n) {
     bits -= n;
-    return (buf >> bits) & ((1u << n) - 1u);
+    return static_cast<uint32_t>(buf >> bits) & ((1u << n) - 1u);
   }
 
   // One bit, for the bit-by-bit code search.
@@ -125,9 +139,7 @@ struct BitReader {
         bits -= len;
         return static_cast<int32_t>(entry & 0xFF);
       }
-      if (!ensure(17)) {
-        if (!ensure(9)) return -1;
-      }
+      if (bits < 17 && !ensure(17) && bits < 9) return -1;
       return slow_decode(t, 9, take(9));
     }
     // Fewer than 8 bits exist before a marker or the end of the input.
@@ -136,58 +148,112 @@ struct BitReader {
     return slow_decode(t, 1, b);
   }
 
-  // Reads s magnitude bits and extends them to a signed value.
+  // Reads s magnitude bits and extends them to a signed value (without a
+  // data-dependent branch: values below 2^(s-1) are negative).
   bool receive(int32_t s, int32_t* value) {
-    if (bits < s && !ensure(s)) return false;
-    int32_t v = static_cast<int32_t>(take(s));
-    if (v < VETAJ_HUFF_EXTEND_TEST[s]) v += static_cast<int32_t>(1u - (1u << s));
-    *value = v;
+    if (!Fetch::kHoldsSymbol && bits < s && !ensure(s)) return false;
+    const int32_t v = static_cast<int32_t>(take(s));
+    const int32_t negative = (v - VETAJ_HUFF_EXTEND_TEST[s]) >> 31;  // all ones or 0
+    *value = v + (negative & static_cast<int32_t>(1u - (1u << s)));
     return true;
   }
 
   // Drops s bits (magnitude bits that are not needed).
   bool drop(int32_t s) {
-    if (bits < s && !ensure(s)) return false;
+    if (!Fetch::kHoldsSymbol && bits < s && !ensure(s)) return false;
     bits -= s;
     return true;
   }
 };
 
-// Window known to hold enough bytes: two bytes per refill, no end tests.
+// Window known to hold enough bytes: no end tests. On 64-bit hosts the
+// buffer is a 64-bit word refilled four bytes at a time, so that one check
+// per symbol covers its code and magnitude bits; bytes fetched ahead are
+// handed back when the state is stored. On 32-bit hosts two bytes per refill.
 struct FastFetch {
+  using Word = uintptr_t;
+  static constexpr bool kWide = sizeof(Word) == 8;
+  // Whether the refill before a symbol guarantees its magnitude bits too.
+  static constexpr bool kHoldsSymbol = kWide;
+  static constexpr int32_t kRefillBelow = kWide ? 32 : 16;
+
   template <class R>
-  static void fill16(R& r) {
-    for (int i = 0; i < 2; ++i) {
-      uint32_t c = r.cur[0];
-      if (c == 0xFF) {
-        if (r.cur[1] == 0x00) {
-          r.cur += 2;
-          r.avail -= 2;
-        } else {
-          c = 0;  // a marker: zeros from here on, the cursor stays on it
-          r.marker_seen = true;
-        }
+  static void append(R& r) {
+    uint32_t c = r.cur[0];
+    if (c == 0xFF) {
+      if (r.cur[1] == 0x00) {
+        r.cur += 2;
+        r.avail -= 2;
       } else {
-        ++r.cur;
-        --r.avail;
+        c = 0;  // a marker: zeros from here on, the cursor stays on it
+        r.marker_seen = true;
       }
-      r.buf = (r.buf << 8) | c;
+    } else {
+      ++r.cur;
+      --r.avail;
     }
-    r.bits += 16;
+    r.buf = (r.buf << 8) | c;
+  }
+  // Appends a whole refill at once when none of its bytes is 0xFF (the
+  // common case), otherwise byte by byte.
+  template <class R>
+  static void fill(R& r) {
+    constexpr int kBytes = kWide ? 4 : 2;
+    if constexpr (kWide) {
+      uint32_t w;
+      std::memcpy(&w, r.cur, 4);
+      const uint32_t inv = ~w;  // a 0xFF byte becomes a zero byte
+      if (((inv - 0x01010101u) & ~inv & 0x80808080u) == 0) {
+        r.buf = (r.buf << 32) | load_be32(w);
+        r.cur += 4;
+        r.avail -= 4;
+        r.bits += 32;
+        return;
+      }
+    } else {
+      if (r.cur[0] != 0xFF && r.cur[1] != 0xFF) {
+        r.buf = (r.buf << 16) | (Word(r.cur[0]) << 8) | r.cur[1];
+        r.cur += 2;
+        r.avail -= 2;
+        r.bits += 16;
+        return;
+      }
+    }
+    for (int i = 0; i < kBytes; ++i) append(r);
+    r.bits += kBytes * 8;
   }
   template <class R>
   static bool ensure(R& r, int32_t n) {
-    while (r.bits < n) fill16(r);
+    while (r.bits < n) fill(r);
     return true;
   }
   template <class R>
   static void prefetch8(R& r) {
-    while (r.bits < 17) fill16(r);
+    while (r.bits < kRefillBelow) fill(r);
+  }
+  // Hands back whole bytes fetched ahead so that at most 32 bits remain.
+  // Only bytes taken since the state was loaded come back (the stored state
+  // never holds more than 32 bits), and a stuffed pair is taken whole, so a
+  // byte that came from one is recognised by its two raw bytes.
+  template <class R>
+  static void normalize(R& r) {
+    while (r.bits > 32) {
+      const bool stuffed = r.cur - 2 >= r.start && r.cur[-1] == 0x00 && r.cur[-2] == 0xFF;
+      const uint32_t back = stuffed ? 2 : 1;
+      r.cur -= back;
+      r.avail += back;
+      r.buf >>= 8;
+      r.bits -= 8;
+    }
   }
 };
 
 // The exact refill rule, with input refills and marker recording.
 struct CarefulFetch {
+  using Word = uint32_t;
+  static constexpr bool kHoldsSymbol = false;
+  template <class R>
+  static void normalize(R&) {}
   // Next raw byte of the input; -1 at its end.
   template <class R>
   static int32_t raw(R& r) {

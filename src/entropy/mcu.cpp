@@ -58,17 +58,26 @@ enum class Keep {
   kNone,  // skip: only the DC predictor is kept up to date
 };
 
+template <class R>
+inline bool skip_ac(R& r, const DerivedHuffTable* act, const AcSkipTable* skip, int32_t k);
+
 // Decodes one block, storing coefficients at zig-zag positions up to
-// kLastStored. Returns false when the input ended.
+// kLastStored. Past that position the rest of the block is stepped over with
+// the skip table when there is one. Returns false when the input ended.
 template <int kLastStored, class R>
 inline bool decode_block(R& r, const DerivedHuffTable* dct, const DerivedHuffTable* act,
-                         int16_t* blk, int32_t* pred, int32_t* last_out) {
+                         const AcSkipTable* skip, int16_t* blk, int32_t* pred,
+                         int32_t* last_out) {
   int32_t s = r.decode(dct);
   if (s < 0) return false;
   int32_t diff = 0;
   if (s != 0 && !r.receive(s, &diff)) return false;
   *pred += diff;
   blk[0] = static_cast<int16_t>(*pred);
+  *last_out = 0;
+  if constexpr (kLastStored == 0) {
+    if (skip != nullptr) return skip_ac(r, act, skip, 1);
+  }
   int32_t last = 0;
   for (int32_t k = 1; k < 64; ++k) {
     const int32_t rs = r.decode(act);
@@ -82,8 +91,12 @@ inline bool decode_block(R& r, const DerivedHuffTable* dct, const DerivedHuffTab
         if (!r.receive(s, &v)) return false;
         blk[VETAJ_NATURAL_ORDER[k]] = static_cast<int16_t>(v);
         last = k;
-      } else if (!r.drop(s)) {
-        return false;
+      } else {
+        if (!r.drop(s)) return false;
+        if (skip != nullptr) {
+          *last_out = last;
+          return skip_ac(r, act, skip, k + 1);
+        }
       }
     } else {
       if (run != 15) break;
@@ -97,27 +110,30 @@ inline bool decode_block(R& r, const DerivedHuffTable* dct, const DerivedHuffTab
 // Steps over the AC data of one block with the skip table, several symbols
 // per lookup; ends exactly where a full decode of the block would.
 template <class R>
-inline bool skip_ac(R& r, const DerivedHuffTable* act, const AcSkipTable* skip) {
-  int32_t k = 1;
+inline bool skip_ac(R& r, const DerivedHuffTable* act, const AcSkipTable* skip, int32_t k) {
   while (k < 64) {
     r.prefetch8();
     if (r.bits >= 8) {
       const uint32_t entry = skip->entry[r.peek(8)];
-      if (entry != 0) {
-        const int32_t advance = static_cast<int32_t>(entry >> 16);
-        const int32_t nbits = static_cast<int32_t>(entry & 0xFFFF);
-        if (advance >= static_cast<int32_t>(kSkipEob)) {
-          if (k + advance - static_cast<int32_t>(kSkipEob) < 64) {
-            r.bits -= nbits;  // may go negative: the next refill restores it
-            return true;
-          }
-        } else if (k + advance <= 64) {
-          r.bits -= nbits;
-          k += advance;
-          continue;
-        }
-        // The lookup runs past the end of the block: finish symbol by symbol.
+      const int32_t advance = static_cast<int32_t>(entry >> 16);
+      const int32_t nbits = static_cast<int32_t>(entry & 0xFFFF);
+      // The common case: complete symbols, and the block goes on.
+      if (entry != 0 && k + advance < 64) {
+        r.bits -= nbits;  // may go negative: the next refill restores it
+        k += advance;
+        continue;
       }
+      // The block ends inside the lookup: at an end of block, or exactly at
+      // position 63.
+      if (entry != 0) {
+        const int32_t eob = static_cast<int32_t>(kSkipEob);
+        if ((advance >= eob && k + advance - eob < 64) || (advance < eob && k + advance == 64)) {
+          r.bits -= nbits;
+          return true;
+        }
+      }
+      // Otherwise the lookup runs past the end of the block (or holds no
+      // complete code): one symbol at a time.
     }
     const int32_t rs = r.decode(act);
     if (rs < 0) return false;
@@ -154,15 +170,16 @@ bool run_mcu(BitReader<Fetch>& r, DecoderInfo* d, int16_t** blocks, bool* dc_out
         int32_t diff = 0;
         if (s != 0 && !r.receive(s, &diff)) return false;
         *p += diff;
-        if (!skip_ac(r, act, skip)) return false;
+        if (!skip_ac(r, act, skip, 1)) return false;
       } else {
         // No skip table for this table: decode the block into scratch space.
         alignas(16) int16_t scratch[64];
         int32_t last;
-        if (!decode_block<0>(r, dct, act, scratch, p, &last)) return false;
+        if (!decode_block<0>(r, dct, act, nullptr, scratch, p, &last)) return false;
       }
     } else {
-      if (!decode_block<kLastStored>(r, dct, act, blocks[b], p, &d->last_nonzero[b]))
+      const AcSkipTable* skip = kLastStored < 63 ? e->block_skip[b] : nullptr;
+      if (!decode_block<kLastStored>(r, dct, act, skip, blocks[b], p, &d->last_nonzero[b]))
         return false;
       if constexpr (kDcCheck) {
         if (*p < -2047 || *p > 2047) *dc_out_of_range = true;
@@ -171,6 +188,11 @@ bool run_mcu(BitReader<Fetch>& r, DecoderInfo* d, int16_t** blocks, bool* dc_out
   }
   for (int i = 0; i < 4; ++i) e->last_dc[i] = pred[i];
   return true;
+}
+
+// An MCU that is not decoded leaves its blocks empty.
+inline void clear_last(DecoderInfo* d) {
+  for (uint32_t b = 0; b < d->blocks_in_mcu; ++b) d->last_nonzero[b] = 0;
 }
 
 // Shared MCU entry: restarts, the insufficient-data rule, then the fast
@@ -184,10 +206,14 @@ int32_t decode_mcu(DecoderInfo* d, int16_t** blocks) {
     if (e->restarts_to_go == 0 && VETAJ_ProcessRestartMarker(d) == 0) return 0;
     if (d->index_use_state == 0 && d->region_map_flag == 0) {
       const int32_t skip = VETAJ_SkipMcuUsingRST(d);
-      if (skip == 1 || skip == 2) return 1;
+      if (skip == 1 || skip == 2) {
+        clear_last(d);
+        return 1;
+      }
     }
   }
   if (e->insufficient != 0) {
+    clear_last(d);
     --e->restarts_to_go;
     return 1;
   }
