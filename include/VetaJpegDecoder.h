@@ -482,8 +482,9 @@ VETAJ_API int32_t VETA_Parse(DecInfo* object, struct StreamWindow* window, JpegI
 /* As VETA_Parse, but a JPEG inside a TIFF is measured up to its EOI. */
 VETAJ_API int32_t VETA_ParseJPEGOffset(DecInfo* object, struct StreamWindow* window,
                                        JpegInfo* info);
-/* GIF summary: 4 for one image, 6 for several, 0 otherwise. Adds the frame
- * delays (milliseconds, each at least minimum_delay) to gif_duration. */
+/* GIF summary: 4 for one image, 6 for several, 0 otherwise. Sets
+ * gif_duration to the sum of the frame delays in milliseconds, each counted
+ * as at least minimum_delay. */
 VETAJ_API int32_t __VETA_ParserGIF(DecInfo* object, struct StreamWindow* window,
                                    JpegInfo* info, int32_t minimum_delay);
 /* WBMP size: 5, or 0. */
