@@ -469,11 +469,26 @@ VETAJ_API int32_t KOLVAVETA_AbortJPEGIter(DecInfo* object);
 /* Image type detection                                                 */
 /* ------------------------------------------------------------------ */
 
+/* Type code (KOLVAVETA_IMAGE_) of the input from its first 8 bytes; also
+ * stored in image_type. A TIFF container is not recognised here. */
 VETAJ_API int32_t KOLVAVETA_GetImageType(DecInfo* object);
+/* For a TIFF container holding a JPEG stream: returns 1 with the stream's
+ * input position and its length up to and including EOI; 0 otherwise. */
 VETAJ_API int32_t KOLVAVETA_GetJpegOffset(DecInfo* object, uint32_t* offset_out,
                                           uint32_t* length_out);
+/* The readers below work on a window that starts at input offset 0. */
 VETAJ_API int32_t VETA_GetImageType(DecInfo* object, struct StreamWindow* window);
 VETAJ_API int32_t VETA_Parse(DecInfo* object, struct StreamWindow* window, JpegInfo* info);
+/* As VETA_Parse, but a JPEG inside a TIFF is measured up to its EOI. */
+VETAJ_API int32_t VETA_ParseJPEGOffset(DecInfo* object, struct StreamWindow* window,
+                                       JpegInfo* info);
+/* GIF summary: 4 for one image, 6 for several, 0 otherwise. Sets
+ * gif_duration to the sum of the frame delays in milliseconds, each counted
+ * as at least minimum_delay. */
+VETAJ_API int32_t __VETA_ParserGIF(DecInfo* object, struct StreamWindow* window,
+                                   JpegInfo* info, int32_t minimum_delay);
+/* WBMP size: 5, or 0. */
+VETAJ_API int32_t __VETA_ParserWBMP(DecInfo* object, struct StreamWindow* window);
 
 /* ------------------------------------------------------------------ */
 /* Host-toolkit entry points                                            */

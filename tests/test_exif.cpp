@@ -429,7 +429,7 @@ TEST(Exif, BufferHeaderChecks) {
   for (auto mutate : std::vector<void (*)(Bytes&)>{
            [](Bytes& b) { b.resize(3); }, [](Bytes& b) { b[0] = 0xFE; },
            [](Bytes& b) { b[1] = 0xE0; }, [](Bytes& b) { b[2] = 0, b[3] = 7; },
-           [](Bytes& b) { b.resize(b.size() - 1); }, [](Bytes& b) { b[9] = 1; },
+           [](Bytes& b) { b.pop_back(); }, [](Bytes& b) { b[9] = 1; },
            [](Bytes& b) { b[8] = 1; }, [](Bytes& b) { b[7] = 'g'; },
            [](Bytes& b) { b[10] = 'X'; }}) {
     Bytes b = good;

@@ -266,7 +266,14 @@ int run_decode(int argc, char** argv) {
   if (!decoder.open(r.input, format.code, options)) return kExitFailure;
   DecInfo* object = decoder.get();
   JpegInfo info{};
-  if (decoder.read_summary(&info) == KOLVAVETA_IMAGE_UNKNOWN) return kExitFailure;
+  const int32_t type = decoder.read_summary(&info);
+  if (type == KOLVAVETA_IMAGE_UNKNOWN) return kExitFailure;
+  if (type != KOLVAVETA_IMAGE_JPEG) {
+    const char* name = image_type_name(type);
+    report("%s: not a JPEG file (it is %s %s image); only JPEG pictures are decoded", r.input,
+           std::strchr("AEIOUaeiou", name[0]) != nullptr ? "an" : "a", name);
+    return kExitFailure;
+  }
   KOLVAVETA_SetDecMode(object, r.mode);
   object->sample_size = r.scale;
 

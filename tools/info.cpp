@@ -148,13 +148,27 @@ int run_info(int argc, char** argv) {
   const int32_t type = decoder.read_summary(&info);
   if (type == KOLVAVETA_IMAGE_UNKNOWN) return kExitFailure;
 
+  DecInfo* object = decoder.get();
+  const bool in_tiff = type == KOLVAVETA_IMAGE_JPEG && object->jpeg_offset != 0;
   std::printf("file:               %s\n", path);
-  std::printf("type:               %s\n", image_type_name(type));
+  std::printf("type:               %s%s\n", image_type_name(type),
+              in_tiff ? " (in a TIFF file)" : "");
   std::printf("width:              %" PRId32 "\n", info.width);
   std::printf("height:             %" PRId32 "\n", info.height);
-  std::printf("progressive:        %s\n", info.progressive != 0 ? "yes" : "no");
-  std::printf("restart interval:   %" PRId32 "\n", info.restart_interval);
-  std::printf("max sampling:       %" PRId32 "x%" PRId32 "\n", info.max_h_samp, info.max_v_samp);
+  if (type == KOLVAVETA_IMAGE_GIF || type == KOLVAVETA_IMAGE_GIF_ANIMATED) {
+    std::printf("frames:             %" PRId32 "\n", info.image_count);
+    std::printf("duration:           %" PRId32 " ms\n", object->gif_duration);
+  } else if (type == KOLVAVETA_IMAGE_PNG) {
+    std::printf("interlaced:         %s\n", info.progressive != 0 ? "yes" : "no");
+  } else if (type == KOLVAVETA_IMAGE_JPEG) {
+    std::printf("progressive:        %s\n", info.progressive != 0 ? "yes" : "no");
+    std::printf("restart interval:   %" PRId32 "\n", info.restart_interval);
+    std::printf("max sampling:       %" PRId32 "x%" PRId32 "\n", info.max_h_samp,
+                info.max_v_samp);
+    uint32_t offset = 0, length = 0;
+    if (in_tiff && KOLVAVETA_GetJpegOffset(object, &offset, &length) != 0)
+      std::printf("JPEG stream:        %" PRIu32 " bytes at offset %" PRIu32 "\n", length, offset);
+  }
   std::printf("input size:         %" PRIu32 " bytes\n", info.input_size);
   if (type == KOLVAVETA_IMAGE_JPEG) {
     const std::string problem = diagnose_jpeg(path);

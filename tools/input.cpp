@@ -194,13 +194,12 @@ bool Decoder::open(const char* path, int32_t output_format, uint32_t options) {
 }
 
 int32_t Decoder::read_summary(JpegInfo* info) {
-  // Identification of other image types goes through the same call: only
-  // the summary routine changes when they are accepted.
-  const int32_t type =
-      KOLVAVETA_JpgParser(object_, info) != 0 ? KOLVAVETA_IMAGE_JPEG : KOLVAVETA_IMAGE_UNKNOWN;
+  const int32_t type = KOLVAVETA_Parser(object_, info);
   if (type == KOLVAVETA_IMAGE_UNKNOWN) {
     if (gKOLVAVETA_Error == KOLVAVETA_ERR_NO_MEMORY) {
       report("%s: out of memory", path());
+    } else if (KOLVAVETA_GetImageType(object_) == KOLVAVETA_IMAGE_GIF) {
+      report("%s: cannot read the GIF (damaged, or wider or higher than 5000 pixels)", path());
     } else {
       std::string reason = diagnose_jpeg(path());
       if (reason.empty()) reason = "cannot read the JPEG header";

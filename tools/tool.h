@@ -43,9 +43,9 @@ class Decoder {
   // Opens `path` with the given output format and option word. Reports the
   // reason and returns false when the file cannot be used.
   bool open(const char* path, int32_t output_format, uint32_t options);
-  // Reads the header summary into `info` and returns the image type code
-  // (KOLVAVETA_IMAGE_JPEG), or reports why the input cannot be read and
-  // returns KOLVAVETA_IMAGE_UNKNOWN.
+  // Identifies the input, reads its summary into `info` and returns the
+  // image type code, or reports why the input cannot be read and returns
+  // KOLVAVETA_IMAGE_UNKNOWN.
   int32_t read_summary(JpegInfo* info);
   // Explains a decode failure on stderr: an unsupported or unreadable frame,
   // or corrupt data.

@@ -238,6 +238,12 @@ bool move_window(StreamWindow* w, uint32_t position) {
   return vj::window_seek(w, position);
 }
 
+// Moves the window to where the JPEG data begins. A caller's stream that
+// cannot seek back reports another position: that counts as refused.
+bool seek_to_jpeg(StreamWindow* w, const DecInfo* o) {
+  return vj::window_seek(w, o->jpeg_offset) && w->consumed == o->jpeg_offset;
+}
+
 // Rotation bits for an Exif orientation value.
 uint32_t rotation_for_orientation(int32_t orientation) {
   switch (orientation) {
@@ -267,14 +273,14 @@ extern "C" VETAJ_API int32_t KOLVAVETA_DecodeJPEG(DecInfo* o, void* buffer, int3
   StreamWindow window;
   if (!vj::window_open(&window, o->stream)) return 0;
   auto close = vj::on_exit([&] { vj::window_close(&window); });
-  if (!vj::window_seek(&window, o->jpeg_offset)) return 0;
+  if (!seek_to_jpeg(&window, o)) return 0;
 
   if ((o->options & KOLVAVETA_OPT_EXIF_ORIENT) != 0) {
     if (ExifInfo* exif = VETAJ_CreatExifInfo(o)) {
       o->options |= rotation_for_orientation(static_cast<int32_t>(exif->orientation));
       VETAJ_DestroyExifInfo(exif);
     }
-    if (!vj::window_seek(&window, o->jpeg_offset)) return 0;
+    if (!seek_to_jpeg(&window, o)) return 0;
   }
 
   const uint32_t policy = o->options & KOLVAVETA_OPT_THUMB_MASK;
@@ -360,7 +366,7 @@ extern "C" VETAJ_API int32_t KOLVAVETA_DecodeJPEG(DecInfo* o, void* buffer, int3
     head_w = header.width;
     head_h = header.height;
   }
-  if (!vj::window_seek(&window, o->jpeg_offset)) return 0;
+  if (!seek_to_jpeg(&window, o)) return 0;
   o->image_width = head_w;
   o->image_height = head_h;
   if (head_w < 1024 || head_h < 1024) o->decode_mode = 0;
