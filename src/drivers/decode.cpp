@@ -179,10 +179,12 @@ int32_t VETAJ_DecodeImage(DecInfo* o, StreamWindow* w, OutputRequest* req) {
     vj::set_error(KOLVAVETA_ERR_SETUP);
     return vj::kStatusFail;
   }
-  // Rows above the crop window are decoded but not stored.
+  // Rows above the crop window are decoded but not stored, and the
+  // converters never see them: their source rows start at the window.
   int32_t status = 0;
   const int32_t row_step = d->row_step;
   d->row_step = 0;
+  d->skip_output = 1;
   const uint32_t crop = static_cast<uint32_t>(d->crop_y);
   while (rows_consumed(d) < crop) {
     if (o->cancel != 0) return vj::kStatusCancelled;
@@ -190,6 +192,7 @@ int32_t VETAJ_DecodeImage(DecInfo* o, StreamWindow* w, OutputRequest* req) {
     status = VETAJ_ProcessData(d, nullptr, &rows, 1);
     if (status == vj::kStatusFail) return vj::kStatusFail;
   }
+  d->skip_output = 0;
   d->row_step = row_step;
   status = VETAJ_Decode_Dualcore_1to1(o, req, d, d->reduced_height);
   if (status == vj::kStatusCancelled) return status;
