@@ -376,7 +376,9 @@ extern "C" VETAJ_API int32_t KOLVAVETA_DecodeJPEG(DecInfo* o, void* buffer, int3
     const int32_t ok = VETAJ_DecodeFrame(o, &window, buffer, width, height);
     o->decode_mode = 0;
     if (ok != 0) return ok;
-    // The thumbnail failed: decode the main picture instead.
+    // The thumbnail failed: decode the main picture instead. The error word
+    // describes the outcome of this call, not of the abandoned attempt.
+    vj::set_error(KOLVAVETA_ERR_NONE);
     head_w = header.width;
     head_h = header.height;
   }
