@@ -109,8 +109,10 @@ int32_t VETAJ_ProcessData(DecoderInfo* d, uint8_t* output, uint32_t* row_ctr,
   RowController& ctl = d->controller;
   int32_t status = 0;
   if (ctl.buffer_full == 0) {
+    // The callback sees the output rows written so far: the progress
+    // percentage divides them by the output height.
     if (d->check_callback != nullptr &&
-        d->check_callback(d->owner, static_cast<int32_t>(rows_consumed(d))) == 0)
+        d->check_callback(d->owner, static_cast<int32_t>(d->output_rows)) == 0)
       return vj::kStatusFail;
     uint8_t** lists[4];
     for (uint32_t ci = 0; ci < d->num_components; ++ci)
