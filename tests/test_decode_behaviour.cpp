@@ -61,6 +61,57 @@ bool frame_size(const Bytes& jpeg, int* width, int* height) {
   return known;
 }
 
+// Offset of the first segment with the given marker code before the scan
+// data (the 0xFF byte), or npos.
+size_t segment(const Bytes& jpeg, uint8_t code) {
+  size_t p = 2;
+  while (p + 4 <= jpeg.size() && jpeg[p] == 0xFF) {
+    if (jpeg[p + 1] == code) return p;
+    if (jpeg[p + 1] == 0xDA) break;
+    p += 2 + ((size_t(jpeg[p + 2]) << 8) | jpeg[p + 3]);
+  }
+  return std::string::npos;
+}
+
+Bytes with_component_ids(Bytes jpeg, std::initializer_list<uint8_t> ids) {
+  const size_t sof = segment(jpeg, 0xC0), sos = segment(jpeg, 0xDA);
+  size_t k = 0;
+  for (const uint8_t id : ids) {
+    jpeg[sof + 10 + 3 * k] = id;
+    jpeg[sos + 5 + 2 * k] = id;
+    ++k;
+  }
+  return jpeg;
+}
+
+Bytes with_adobe_transform(Bytes jpeg, uint8_t transform) {
+  jpeg[segment(jpeg, 0xEE) + 15] = transform;
+  return jpeg;
+}
+
+Bytes without_segment(Bytes jpeg, uint8_t code) {
+  const size_t at = segment(jpeg, code);
+  const size_t length = 2 + ((size_t(jpeg[at + 2]) << 8) | jpeg[at + 3]);
+  jpeg.erase(jpeg.begin() + std::ptrdiff_t(at), jpeg.begin() + std::ptrdiff_t(at + length));
+  return jpeg;
+}
+
+// Drops the last component from the frame and scan headers.
+Bytes without_last_component(Bytes jpeg) {
+  for (const uint8_t code : {uint8_t(0xDA), uint8_t(0xC0)}) {
+    const size_t at = segment(jpeg, code);
+    const size_t count_at = at + (code == 0xC0 ? 9 : 4), spec = code == 0xC0 ? 3 : 2;
+    const size_t n = jpeg[count_at];
+    const size_t last = count_at + 1 + (n - 1) * spec;
+    jpeg.erase(jpeg.begin() + std::ptrdiff_t(last), jpeg.begin() + std::ptrdiff_t(last + spec));
+    jpeg[count_at] = uint8_t(n - 1);
+    const size_t length = ((size_t(jpeg[at + 2]) << 8) | jpeg[at + 3]) - spec;
+    jpeg[at + 2] = uint8_t(length >> 8);
+    jpeg[at + 3] = uint8_t(length);
+  }
+  return jpeg;
+}
+
 // A packed buffer of w x h pixels turned 90 degrees clockwise (h x w).
 std::vector<uint8_t> turned_clockwise(const std::vector<uint8_t>& src, int w, int h, int bpp) {
   std::vector<uint8_t> out(src.size());
@@ -335,6 +386,31 @@ TEST(Thumbnails, SampleSizeSelectsTheThumbnail) {
   KOLVAVETA_DestroyDecInfo(o);
 }
 
+// The picture that a sample size divides is the main picture whose header
+// the decode reads: without a header summary, and again after a thumbnail
+// decode has left the thumbnail's size in the object, the thumbnail is
+// chosen as with the summary.
+TEST(Thumbnails, SampleSizeDividesTheMainPictureWithoutASummary) {
+  const Pictures p = load_with_thumbnail("exif_thumb_ii_640x480.jpg", 160, 120);
+  DecInfo* o = KOLVAVETA_CreateDecInfo(KOLVAVETA_IO_MEMORY, const_cast<uint8_t*>(p.file.data()),
+                                       uint32_t(p.file.size()), KOLVAVETA_FMT_RGBA8888, 0);
+  ASSERT_NE(o, nullptr);
+  for (const uint32_t policy : {KOLVAVETA_OPT_THUMB_IF_LARGE, KOLVAVETA_OPT_THUMB_ALWAYS,
+                                KOLVAVETA_OPT_THUMB_IF_LARGE}) {
+    SCOPED_TRACE(testing::Message() << "policy " << policy);
+    const Decoded d = decode_on(o, {.width = 640, .height = 480, .options = policy, .sample_size = 4});
+    EXPECT_EQ(d.ok, 1) << d.error;
+    EXPECT_EQ(d.sample_size, 1u);
+    EXPECT_EQ(d.output_width, 160);
+    EXPECT_EQ(d.output_height, 120);
+    EXPECT_TRUE(same_output(d.buffer,
+                            expected_picture(p.thumb, Sampling::kCentre, 7, 640, 480, 160, 120),
+                            centred(7, 640, 480, 160, 120)));
+  }
+  KOLVAVETA_DestroyJpegInfo(o);
+  KOLVAVETA_DestroyDecInfo(o);
+}
+
 // Without a thumbnail a sample size makes the target the picture divided by
 // it, limited to the buffer.
 TEST(SampleSize, TargetIsThePictureDividedBySampleSize) {
@@ -522,6 +598,36 @@ TEST(Progress, FiresOnEveryThirdCheckWithThePercentage) {
   g_log = nullptr;
 }
 
+// The check callback receives the rows written so far, so the percentage
+// stays within 0..100 when the picture is resized or cropped.
+TEST(Progress, PercentagesFollowTheOutputRows) {
+  const Bytes jpeg = read_fixture("base_420_q90_1024x768.jpg");
+  const DecodeRequest requests[] = {
+      {.format = 0, .width = 700, .height = 525, .options = KOLVAVETA_OPT_THUMB_NEVER},
+      {.format = 0, .width = 1000, .height = 600, .options = KOLVAVETA_OPT_THUMB_NEVER | KOLVAVETA_OPT_FIT_FILL},
+      {.format = 0, .width = 1100, .height = 900, .options = KOLVAVETA_OPT_THUMB_NEVER | KOLVAVETA_OPT_FIT_STRETCH},
+  };
+  for (const DecodeRequest& r : requests) {
+    SCOPED_TRACE(testing::Message() << r.width << "x" << r.height);
+    CallLog log;
+    DecInfo* o = object_with_progress(jpeg, &log);
+    const Decoded d = decode_on(o, r);
+    ASSERT_EQ(d.ok, 1);
+    ASSERT_FALSE(log.percents.empty());
+    for (size_t i = 0; i < log.check_rows.size(); ++i) {
+      EXPECT_LE(log.check_rows[i], std::min(r.height, d.output_height));
+      if (i > 0) {
+        EXPECT_GE(log.check_rows[i], log.check_rows[i - 1]);
+      }
+    }
+    for (const int32_t percent : log.percents) EXPECT_LE(percent, 100);
+    EXPECT_GE(log.percents.back(), 50);
+    KOLVAVETA_DestroyJpegInfo(o);
+    KOLVAVETA_DestroyDecInfo(o);
+    g_log = nullptr;
+  }
+}
+
 TEST(Progress, RefusalAbortsAndTheObjectDecodesAgain) {
   const Bytes jpeg = read_fixture("base_420_q88_17x1023.jpg");
   const Decoded reference = decode_full(jpeg, 17, 1023);
@@ -703,11 +809,15 @@ TEST(DamagedData, TruncationAnywhereFailsOrDamagesOnlyTheBottom) {
   }
 }
 
-// Every fixture cut at several points and with seeded bit flips, through
-// every format, rotation and thumbnail policy in turn: the decode ends
-// without touching memory outside the buffer (run under the sanitizers).
+// Every fixture cut at several points and with seeded bit flips (anywhere,
+// or only in the marker segments before the entropy data), through every
+// format, rotation, fit mode and thumbnail policy in turn, at its own size
+// and resized: the decode ends without touching memory outside the buffer
+// (run under the sanitizers).
 TEST(DamagedData, CutsAndBitFlipsOverTheCorpus) {
   const int formats[] = {0, 1, 2, 5, 7, 8, 9, 4, 12};
+  const uint32_t fits[] = {KOLVAVETA_OPT_FIT_CENTRE, KOLVAVETA_OPT_FIT_FILL, KOLVAVETA_OPT_FIT_STRETCH,
+                           KOLVAVETA_OPT_FIT_ROWLEN};
   std::mt19937 rng(20240611);
   size_t turn = 0;
   std::vector<std::string> files = list_fixtures(".jpg");
@@ -717,21 +827,62 @@ TEST(DamagedData, CutsAndBitFlipsOverTheCorpus) {
     const Bytes jpeg = read_fixture(name);
     int w = 0, h = 0;
     if (!frame_size(jpeg, &w, &h)) w = 64, h = 48;
-    const int variants = jpeg.size() > 50000 ? 4 : 10;
+    const size_t sos = segment(jpeg, 0xDA);
+    const size_t header = sos == std::string::npos ? jpeg.size() : sos + 4;
+    const int variants = jpeg.size() > 50000 ? 6 : 12;
     for (int v = 0; v < variants; ++v, ++turn) {
       Bytes damaged = jpeg;
-      if (v % 2 == 0) {
+      if (v % 3 == 0) {
         damaged.resize(size_t(rng() % jpeg.size()) + 1);
       } else {
+        const size_t span = v % 3 == 1 ? damaged.size() : header;
         for (int flips = 1 + int(rng() % 8); flips > 0; --flips)
-          damaged[rng() % damaged.size()] ^= uint8_t(1u << (rng() % 8));
+          damaged[rng() % span] ^= uint8_t(1u << (rng() % 8));
       }
       const uint32_t options = uint32_t(turn % 4) | (uint32_t(turn / 4 % 4) << 2) |
+                               fits[turn / 16 % std::size(fits)] |
                                (turn % 5 == 0 ? KOLVAVETA_OPT_EXIF_ORIENT : 0u);
       const int format = formats[turn % std::size(formats)];
-      const Decoded d = decode_bytes(damaged, {.format = format, .width = w + int(turn % 3),
-                                               .height = h + int(turn % 2), .options = options});
+      const bool resized = turn % 2 == 1;
+      const DecodeRequest r{.format = format,
+                            .width = resized ? w * 3 / 4 + 1 : w + int(turn % 3),
+                            .height = resized ? h * 5 / 6 + 1 : h + int(turn % 2),
+                            .options = options};
+      const Decoded d = decode_bytes(damaged, r);
       ASSERT_TRUE(d.guard_intact) << "variant " << v;
+    }
+  }
+}
+
+// Frame sizes that disagree with the entropy data, or break the limits:
+// sizes of 0 or above 50000 are refused, the others decode what the data
+// holds (concealing the bottom rows) or fail, inside the buffer.
+TEST(DamagedData, FrameSizesThatDoNotMatchTheData) {
+  const Bytes jpeg = read_fixture("base_420_q90_96x64.jpg");
+  struct Case {
+    int w, h;
+    bool refused;
+  };
+  for (const Case& c : {Case{0, 64, true}, Case{96, 0, true}, Case{50001, 8, true}, Case{8, 50001, true},
+                        Case{65535, 65535, true}, Case{96, 6400, false}, Case{4000, 64, false},
+                        Case{50000, 8, false}, Case{1, 1, false}, Case{17, 3, false}, Case{97, 65, false}}) {
+    SCOPED_TRACE(testing::Message() << c.w << "x" << c.h);
+    Bytes patched = jpeg;
+    const size_t sof = segment(patched, 0xC0);
+    patched[sof + 5] = uint8_t(c.h >> 8);
+    patched[sof + 6] = uint8_t(c.h);
+    patched[sof + 7] = uint8_t(c.w >> 8);
+    patched[sof + 8] = uint8_t(c.w);
+    const int bw = std::clamp(c.w, 1, 50000), bh = std::clamp(c.h, 1, 6400);
+    for (const uint32_t policy : {KOLVAVETA_OPT_THUMB_NEVER, KOLVAVETA_OPT_THUMB_IF_LARGE}) {
+      const Decoded d = decode_bytes(patched, {.format = 0, .width = bw, .height = bh, .options = policy});
+      EXPECT_TRUE(d.guard_intact);
+      if (c.refused) {
+        EXPECT_EQ(d.ok, 0);
+      }
+      if (c.refused && policy == KOLVAVETA_OPT_THUMB_NEVER) {
+        EXPECT_EQ(d.error, KOLVAVETA_ERR_SETUP);
+      }
     }
   }
 }
@@ -830,57 +981,6 @@ TEST(Reuse, OneObjectDecodesManyRequests) {
 
 // ---------------------------------------------------------------------------
 // Colour spaces.
-
-// Offset of the first segment with the given marker code before the scan
-// data (the 0xFF byte), or npos.
-size_t segment(const Bytes& jpeg, uint8_t code) {
-  size_t p = 2;
-  while (p + 4 <= jpeg.size() && jpeg[p] == 0xFF) {
-    if (jpeg[p + 1] == code) return p;
-    if (jpeg[p + 1] == 0xDA) break;
-    p += 2 + ((size_t(jpeg[p + 2]) << 8) | jpeg[p + 3]);
-  }
-  return std::string::npos;
-}
-
-Bytes with_component_ids(Bytes jpeg, std::initializer_list<uint8_t> ids) {
-  const size_t sof = segment(jpeg, 0xC0), sos = segment(jpeg, 0xDA);
-  size_t k = 0;
-  for (const uint8_t id : ids) {
-    jpeg[sof + 10 + 3 * k] = id;
-    jpeg[sos + 5 + 2 * k] = id;
-    ++k;
-  }
-  return jpeg;
-}
-
-Bytes with_adobe_transform(Bytes jpeg, uint8_t transform) {
-  jpeg[segment(jpeg, 0xEE) + 15] = transform;
-  return jpeg;
-}
-
-Bytes without_segment(Bytes jpeg, uint8_t code) {
-  const size_t at = segment(jpeg, code);
-  const size_t length = 2 + ((size_t(jpeg[at + 2]) << 8) | jpeg[at + 3]);
-  jpeg.erase(jpeg.begin() + std::ptrdiff_t(at), jpeg.begin() + std::ptrdiff_t(at + length));
-  return jpeg;
-}
-
-// Drops the last component from the frame and scan headers.
-Bytes without_last_component(Bytes jpeg) {
-  for (const uint8_t code : {uint8_t(0xDA), uint8_t(0xC0)}) {
-    const size_t at = segment(jpeg, code);
-    const size_t count_at = at + (code == 0xC0 ? 9 : 4), spec = code == 0xC0 ? 3 : 2;
-    const size_t n = jpeg[count_at];
-    const size_t last = count_at + 1 + (n - 1) * spec;
-    jpeg.erase(jpeg.begin() + std::ptrdiff_t(last), jpeg.begin() + std::ptrdiff_t(last + spec));
-    jpeg[count_at] = uint8_t(n - 1);
-    const size_t length = ((size_t(jpeg[at + 2]) << 8) | jpeg[at + 3]) - spec;
-    jpeg[at + 2] = uint8_t(length >> 8);
-    jpeg[at + 3] = uint8_t(length);
-  }
-  return jpeg;
-}
 
 #if VETAJ_HAVE_LIBJPEG
 

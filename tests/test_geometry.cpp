@@ -28,6 +28,9 @@ const char* format_name(int format) {
     case 5: return "ARGB";
     case 7: return "RGBA";
     case 8: return "BGRA";
+    case 3: return "RGB888_3";
+    case 9: return "RGB565_9";
+    case 12: return "RGBA_12";
     default: return "other";
   }
 }
@@ -98,7 +101,9 @@ INSTANTIATE_TEST_SUITE_P(
     FormatsAndRotations, Placed,
     ::testing::Combine(::testing::Values(KOLVAVETA_FMT_RGB565, KOLVAVETA_FMT_RGBA8888,
                                          KOLVAVETA_FMT_BGRA8888, KOLVAVETA_FMT_ARGB8888,
-                                         KOLVAVETA_FMT_RGB888, KOLVAVETA_FMT_YUV420),
+                                         KOLVAVETA_FMT_RGB888, KOLVAVETA_FMT_YUV420,
+                                         KOLVAVETA_FMT_RGB888_ALT, KOLVAVETA_FMT_RGB565_B,
+                                         KOLVAVETA_FMT_RGBA8888_B),
                        ::testing::Values(KOLVAVETA_OPT_ROTATE_0, KOLVAVETA_OPT_ROTATE_90,
                                          KOLVAVETA_OPT_ROTATE_180, KOLVAVETA_OPT_ROTATE_270)),
     [](const ::testing::TestParamInfo<std::tuple<int, uint32_t>>& param) {
@@ -202,6 +207,26 @@ INSTANTIATE_TEST_SUITE_P(
       return std::string(std::get<0>(param.param).label) + "_" +
              format_name(std::get<1>(param.param));
     });
+
+// Format 4 is accepted and only counts rows: whatever the geometry, the
+// decode succeeds and writes nothing.
+TEST(FitModes, CountOnlyFormatWritesNothing) {
+  for (const char* fixture : {"base_420_q90_96x64.jpg", "grey_q85_33x17.jpg", "cmyk_adobe_2x2_q85_64x48.jpg"}) {
+    SCOPED_TRACE(fixture);
+    const Bytes jpeg = read_fixture(fixture);
+    for (const uint32_t options : {0x001u, 0x005u, 0x30Bu, 0x70Du, 0x101u}) {
+      std::vector<uint8_t> buffer(96 * 96 * 4, kFill);
+      DecInfo* o = KOLVAVETA_CreateDecInfo(KOLVAVETA_IO_MEMORY, const_cast<uint8_t*>(jpeg.data()),
+                                           uint32_t(jpeg.size()), KOLVAVETA_FMT_NONE, options);
+      EXPECT_EQ(KOLVAVETA_DecodeJPEG(o, buffer.data(), 90, 70), 1) << options;
+      EXPECT_GT(o->output_width, 0);
+      KOLVAVETA_DestroyJpegInfo(o);
+      KOLVAVETA_DestroyDecInfo(o);
+      EXPECT_TRUE(std::all_of(buffer.begin(), buffer.end(), [](uint8_t b) { return b == kFill; }))
+          << options;
+    }
+  }
+}
 
 #if VETAJ_HAVE_LIBJPEG
 
