@@ -112,6 +112,20 @@ Bytes without_last_component(Bytes jpeg) {
   return jpeg;
 }
 
+// A fixture, its frame size and its RGBA decode at that size.
+struct Whole {
+  Bytes jpeg;
+  int width = 0, height = 0;
+  Decoded decoded;
+};
+Whole whole(const std::string& fixture) {
+  Whole out;
+  out.jpeg = read_fixture(fixture);
+  if (frame_size(out.jpeg, &out.width, &out.height))
+    out.decoded = decode_full(out.jpeg, out.width, out.height);
+  return out;
+}
+
 // A packed buffer of w x h pixels turned 90 degrees clockwise (h x w).
 std::vector<uint8_t> turned_clockwise(const std::vector<uint8_t>& src, int w, int h, int bpp) {
   std::vector<uint8_t> out(src.size());
@@ -129,12 +143,12 @@ std::vector<uint8_t> turned_clockwise(const std::vector<uint8_t>& src, int w, in
 
 struct ResizeCase {
   const char* fixture;
-  uint32_t fit;             // with thumbnail policy 0: the header is read
-  int mode;                 // decode mode set by the caller
+  uint32_t fit;  // with thumbnail policy 0: the header is read
+  int mode;      // decode mode set by the caller
   int buffer_w, buffer_h;
   int out_w, out_h;
-  int mode_after;           // decode mode left in the object
-  Sampling sampling;        // centre sampling or quarter-point averages
+  int mode_after;     // decode mode left in the object
+  Sampling sampling;  // centre sampling or quarter-point averages
 };
 
 void PrintTo(const ResizeCase& c, std::ostream* os) {
@@ -175,8 +189,11 @@ TEST_P(Resizing, MatchesTheSamplingRulesOnTheFullSizePicture) {
   const Bytes jpeg = read_fixture(c.fixture);
   FullPicture full;
   ASSERT_TRUE(full_picture(jpeg, &full));
-  const Decoded d = decode_bytes(jpeg, {.format = format, .width = c.buffer_w, .height = c.buffer_h,
-                                        .options = c.fit, .mode = c.mode});
+  const Decoded d = decode_bytes(jpeg, {.format = format,
+                                        .width = c.buffer_w,
+                                        .height = c.buffer_h,
+                                        .options = c.fit,
+                                        .mode = c.mode});
   ASSERT_EQ(d.ok, 1) << d.error;
   EXPECT_EQ(d.output_width, c.out_w);
   EXPECT_EQ(d.output_height, c.out_h);
@@ -228,8 +245,9 @@ Pictures load_with_thumbnail(const char* fixture, int thumb_w, int thumb_h) {
 // of its size.
 std::vector<uint8_t> expected_picture(const FullPicture& picture, Sampling sampling, int format,
                                       int buffer_w, int buffer_h, int out_w, int out_h) {
-  return expected_buffer(centred(format, buffer_w, buffer_h, out_w, out_h),
-                         resampled(picture.at, sampling, 0, 0, picture.width, picture.height, out_w, out_h));
+  return expected_buffer(
+      centred(format, buffer_w, buffer_h, out_w, out_h),
+      resampled(picture.at, sampling, 0, 0, picture.width, picture.height, out_w, out_h));
 }
 
 struct ThumbCase {
@@ -237,7 +255,7 @@ struct ThumbCase {
   int thumb_w, thumb_h;
   uint32_t policy;
   int buffer_w, buffer_h;
-  bool thumbnail;           // the thumbnail is decoded, else the main picture
+  bool thumbnail;  // the thumbnail is decoded, else the main picture
   int out_w, out_h;
 };
 
@@ -272,23 +290,23 @@ TEST_P(Thumbnails, PolicyChoosesThePicture) {
   const ThumbCase& c = GetParam();
   const Pictures p = load_with_thumbnail(c.fixture, c.thumb_w, c.thumb_h);
   for (const int format : {KOLVAVETA_FMT_RGBA8888, KOLVAVETA_FMT_RGB565}) {
-    const Decoded d = decode_bytes(p.file, {.format = format, .width = c.buffer_w,
-                                            .height = c.buffer_h, .options = c.policy});
+    const Decoded d = decode_bytes(
+        p.file, {.format = format, .width = c.buffer_w, .height = c.buffer_h, .options = c.policy});
     ASSERT_EQ(d.ok, 1) << d.error;
     EXPECT_EQ(d.output_width, c.out_w);
     EXPECT_EQ(d.output_height, c.out_h);
     EXPECT_EQ(d.decode_mode, 0);
     const FullPicture& picture = c.thumbnail ? p.thumb : p.main;
-    const Sampling sampling = c.thumbnail || (c.out_w <= 99 && c.out_h <= 99) ? Sampling::kCentre
-                                                                               : Sampling::kAverage;
+    const Sampling sampling =
+        c.thumbnail || (c.out_w <= 99 && c.out_h <= 99) ? Sampling::kCentre : Sampling::kAverage;
     Placement where;
     where.format = format;
     where.buffer_width = c.buffer_w;
     where.buffer_height = c.buffer_h;
-    EXPECT_TRUE(same_output(d.buffer,
-                            expected_picture(picture, sampling, format, c.buffer_w, c.buffer_h,
-                                             c.out_w, c.out_h),
-                            where))
+    EXPECT_TRUE(same_output(
+        d.buffer,
+        expected_picture(picture, sampling, format, c.buffer_w, c.buffer_h, c.out_w, c.out_h),
+        where))
         << (c.thumbnail ? "thumbnail" : "main picture") << " expected";
   }
 }
@@ -304,29 +322,33 @@ TEST(Thumbnails, BrokenThumbnailFallsBackToTheMainPicture) {
   size_t sof = at + 2;
   while (!(p.file[sof] == 0xFF && p.file[sof + 1] == 0xC0)) ++sof;
   p.file[sof + 4] = 12;  // sample precision of the thumbnail's frame
-  const Decoded d = decode_bytes(p.file, {.width = 400, .height = 300, .options = KOLVAVETA_OPT_THUMB_ALWAYS});
+  const Decoded d =
+      decode_bytes(p.file, {.width = 400, .height = 300, .options = KOLVAVETA_OPT_THUMB_ALWAYS});
   ASSERT_EQ(d.ok, 1);
   EXPECT_EQ(d.error, 0);
   EXPECT_EQ(d.output_width, 400);
   EXPECT_EQ(d.image_width, 640);
-  EXPECT_TRUE(same_output(d.buffer, expected_picture(p.main, Sampling::kAverage, 7, 400, 300, 400, 300),
+  EXPECT_TRUE(same_output(d.buffer,
+                          expected_picture(p.main, Sampling::kAverage, 7, 400, 300, 400, 300),
                           centred(7, 400, 300, 400, 300)));
 }
 
 // Uncompressed thumbnails are never decoded: the main picture is.
 TEST(Thumbnails, UncompressedThumbnailsLeaveTheMainPicture) {
-  for (const char* fixture : {"thumb_jfxx_rgb_128x96.jpg", "thumb_jfxx_pal_128x96.jpg",
-                              "thumb_jfif_rgb4x3_64x48.jpg"}) {
+  for (const char* fixture :
+       {"thumb_jfxx_rgb_128x96.jpg", "thumb_jfxx_pal_128x96.jpg", "thumb_jfif_rgb4x3_64x48.jpg"}) {
     SCOPED_TRACE(fixture);
     const Bytes file = read_fixture(fixture);
     FullPicture main;
     ASSERT_TRUE(full_picture(file, &main));
     for (const uint32_t policy : {0u, 2u, 3u}) {
-      const Decoded d = decode_bytes(file, {.width = main.width, .height = main.height, .options = policy});
+      const Decoded d =
+          decode_bytes(file, {.width = main.width, .height = main.height, .options = policy});
       ASSERT_EQ(d.ok, 1) << d.error;
       EXPECT_EQ(d.output_width, main.width);
       const Placement where = centred(7, main.width, main.height, main.width, main.height);
-      EXPECT_TRUE(same_output(d.buffer, expected_buffer(where, main.at), where)) << "policy " << policy;
+      EXPECT_TRUE(same_output(d.buffer, expected_buffer(where, main.at), where))
+          << "policy " << policy;
     }
   }
 }
@@ -338,8 +360,9 @@ TEST(Thumbnails, OrientedPolicyTurnsALandscapeThumbnailOfAPortraitPicture) {
   for (const int format : {KOLVAVETA_FMT_RGBA8888, KOLVAVETA_FMT_RGB565, KOLVAVETA_FMT_RGB565_B}) {
     for (const auto& [w, h] : {std::pair{45, 60}, std::pair{50, 60}}) {
       SCOPED_TRACE(testing::Message() << "format " << format << " " << w << "x" << h);
-      const Decoded d = decode_bytes(p.file, {.format = format, .width = w, .height = h,
-                                              .options = KOLVAVETA_OPT_THUMB_ORIENTED});
+      const Decoded d = decode_bytes(
+          p.file,
+          {.format = format, .width = w, .height = h, .options = KOLVAVETA_OPT_THUMB_ORIENTED});
       ASSERT_EQ(d.ok, 1) << d.error;
       // The thumbnail fitted into the transposed buffer (h x w), turned.
       const std::vector<uint8_t> upright =
@@ -348,7 +371,8 @@ TEST(Thumbnails, OrientedPolicyTurnsALandscapeThumbnailOfAPortraitPicture) {
       where.format = format;
       where.buffer_width = w;
       where.buffer_height = h;
-      EXPECT_TRUE(same_output(d.buffer, turned_clockwise(upright, h, w, pixel_bytes(format)), where));
+      EXPECT_TRUE(
+          same_output(d.buffer, turned_clockwise(upright, h, w, pixel_bytes(format)), where));
     }
   }
   // With the same orientation policy 0 decodes the thumbnail upright.
@@ -373,7 +397,8 @@ TEST(Thumbnails, SampleSizeSelectsTheThumbnail) {
   EXPECT_EQ(d.sample_size, 1u);
   EXPECT_EQ(d.output_width, 160);
   EXPECT_EQ(d.output_height, 120);
-  EXPECT_TRUE(same_output(d.buffer, expected_picture(p.thumb, Sampling::kCentre, 7, 640, 480, 160, 120),
+  EXPECT_TRUE(same_output(d.buffer,
+                          expected_picture(p.thumb, Sampling::kCentre, 7, 640, 480, 160, 120),
                           centred(7, 640, 480, 160, 120)));
   // Divided by 2 the picture is larger than the thumbnail: the main picture
   // at 320x240 (which needs the reduced transform), sample size kept.
@@ -395,10 +420,11 @@ TEST(Thumbnails, SampleSizeDividesTheMainPictureWithoutASummary) {
   DecInfo* o = KOLVAVETA_CreateDecInfo(KOLVAVETA_IO_MEMORY, const_cast<uint8_t*>(p.file.data()),
                                        uint32_t(p.file.size()), KOLVAVETA_FMT_RGBA8888, 0);
   ASSERT_NE(o, nullptr);
-  for (const uint32_t policy : {KOLVAVETA_OPT_THUMB_IF_LARGE, KOLVAVETA_OPT_THUMB_ALWAYS,
-                                KOLVAVETA_OPT_THUMB_IF_LARGE}) {
+  for (const uint32_t policy :
+       {KOLVAVETA_OPT_THUMB_IF_LARGE, KOLVAVETA_OPT_THUMB_ALWAYS, KOLVAVETA_OPT_THUMB_IF_LARGE}) {
     SCOPED_TRACE(testing::Message() << "policy " << policy);
-    const Decoded d = decode_on(o, {.width = 640, .height = 480, .options = policy, .sample_size = 4});
+    const Decoded d =
+        decode_on(o, {.width = 640, .height = 480, .options = policy, .sample_size = 4});
     EXPECT_EQ(d.ok, 1) << d.error;
     EXPECT_EQ(d.sample_size, 1u);
     EXPECT_EQ(d.output_width, 160);
@@ -486,18 +512,17 @@ INSTANTIATE_TEST_SUITE_P(Fixtures, Orientation,
 // and so does every picture whose header is not read (thumbnail policy 1).
 
 TEST(DecodeMode, SmallPicturesDecodeInModeZero) {
-  for (const char* fixture : {"base_420_q90_96x64.jpg", "base_420_q81_1023x17.jpg", "base_420_q88_17x1023.jpg"}) {
+  for (const char* fixture :
+       {"base_420_q90_96x64.jpg", "base_420_q81_1023x17.jpg", "base_420_q88_17x1023.jpg"}) {
     SCOPED_TRACE(fixture);
-    const Bytes jpeg = read_fixture(fixture);
-    int w = 0, h = 0;
-    ASSERT_TRUE(frame_size(jpeg, &w, &h));
-    const Decoded best = decode_full(jpeg, w, h);
-    ASSERT_EQ(best.ok, 1);
+    const Whole best = whole(fixture);
+    ASSERT_EQ(best.decoded.ok, 1);
     for (const int mode : {1, 2, 3, 4}) {
-      const Decoded d = decode_bytes(jpeg, {.width = w, .height = h, .options = 0, .mode = mode});
+      const Decoded d = decode_bytes(
+          best.jpeg, {.width = best.width, .height = best.height, .options = 0, .mode = mode});
       ASSERT_EQ(d.ok, 1) << "mode " << mode;
       EXPECT_EQ(d.decode_mode, 0);
-      EXPECT_EQ(d.buffer, best.buffer) << "mode " << mode;
+      EXPECT_EQ(d.buffer, best.decoded.buffer) << "mode " << mode;
     }
   }
 }
@@ -527,7 +552,7 @@ struct CallLog {
   std::vector<int32_t> check_rows;  // row passed to each check call
   std::vector<size_t> fired_at;     // check call (0-based) during which progress fired
   std::vector<int32_t> percents;
-  int32_t stop_after_check = -1;    // the check callback sets cancel on this call
+  int32_t stop_after_check = -1;  // the check callback sets cancel on this call
   int32_t progress_result = 1;
   DecInfo* object = nullptr;
 };
@@ -604,8 +629,14 @@ TEST(Progress, PercentagesFollowTheOutputRows) {
   const Bytes jpeg = read_fixture("base_420_q90_1024x768.jpg");
   const DecodeRequest requests[] = {
       {.format = 0, .width = 700, .height = 525, .options = KOLVAVETA_OPT_THUMB_NEVER},
-      {.format = 0, .width = 1000, .height = 600, .options = KOLVAVETA_OPT_THUMB_NEVER | KOLVAVETA_OPT_FIT_FILL},
-      {.format = 0, .width = 1100, .height = 900, .options = KOLVAVETA_OPT_THUMB_NEVER | KOLVAVETA_OPT_FIT_STRETCH},
+      {.format = 0,
+       .width = 1000,
+       .height = 600,
+       .options = KOLVAVETA_OPT_THUMB_NEVER | KOLVAVETA_OPT_FIT_FILL},
+      {.format = 0,
+       .width = 1100,
+       .height = 900,
+       .options = KOLVAVETA_OPT_THUMB_NEVER | KOLVAVETA_OPT_FIT_STRETCH},
   };
   for (const DecodeRequest& r : requests) {
     SCOPED_TRACE(testing::Message() << r.width << "x" << r.height);
@@ -628,50 +659,42 @@ TEST(Progress, PercentagesFollowTheOutputRows) {
   }
 }
 
-TEST(Progress, RefusalAbortsAndTheObjectDecodesAgain) {
+int32_t refusing_check(DecInfo*, int32_t) { return 0; }
+
+// A progress callback that refuses, the cancel flag set from the check
+// callback and a check callback that refuses each end the decode with 0;
+// the object then decodes the picture again.
+TEST(Cancel, AbortsLeaveTheObjectReusable) {
   const Bytes jpeg = read_fixture("base_420_q88_17x1023.jpg");
   const Decoded reference = decode_full(jpeg, 17, 1023);
   ASSERT_EQ(reference.ok, 1);
-  CallLog log;
-  log.progress_result = 0;
-  DecInfo* o = object_with_progress(jpeg, &log);
-  const Decoded refused = decode_on(o, {.width = 17, .height = 1023});
-  EXPECT_EQ(refused.ok, 0);
-  EXPECT_EQ(log.fired_at.size(), 1u);
-  EXPECT_LT(log.check_rows.size(), 10u);
-  log.progress_result = 1;
-  const Decoded again = decode_on(o, {.width = 17, .height = 1023});
-  EXPECT_EQ(again.ok, 1);
-  EXPECT_EQ(again.buffer, reference.buffer);
-  KOLVAVETA_DestroyJpegInfo(o);
-  KOLVAVETA_DestroyDecInfo(o);
-  g_log = nullptr;
-}
-
-int32_t refusing_check(DecInfo*, int32_t) { return 0; }
-
-TEST(Cancel, CheckCallbackAndCancelFlagStopTheDecode) {
-  const Bytes jpeg = read_fixture("base_420_q90_1024x768.jpg");
-  const Decoded reference = decode_full(jpeg, 1024, 768);
-  ASSERT_EQ(reference.ok, 1);
-  CallLog log;
-  log.stop_after_check = 3;
-  DecInfo* o = object_with_progress(jpeg, &log);
-  const Decoded cancelled = decode_on(o, {.width = 1024, .height = 768});
-  EXPECT_EQ(cancelled.ok, 0);
-  EXPECT_EQ(log.check_rows.size(), 3u);
-  // The flag is cleared when the next decode starts.
-  log.stop_after_check = -1;
-  const Decoded again = decode_on(o, {.width = 1024, .height = 768});
-  EXPECT_EQ(again.ok, 1);
-  EXPECT_EQ(again.buffer, reference.buffer);
-  o->check_callback = refusing_check;
-  EXPECT_EQ(decode_on(o, {.width = 1024, .height = 768}).ok, 0);
-  o->check_callback = KOLVAVETA_CheckFn;
-  EXPECT_EQ(decode_on(o, {.width = 1024, .height = 768}).buffer, reference.buffer);
-  KOLVAVETA_DestroyJpegInfo(o);
-  KOLVAVETA_DestroyDecInfo(o);
-  g_log = nullptr;
+  enum class Abort { kProgress, kCancelFlag, kCheck };
+  for (const Abort abort : {Abort::kProgress, Abort::kCancelFlag, Abort::kCheck}) {
+    SCOPED_TRACE(int(abort));
+    CallLog log;
+    DecInfo* o = object_with_progress(jpeg, &log);
+    log.progress_result = abort == Abort::kProgress ? 0 : 1;
+    log.stop_after_check = abort == Abort::kCancelFlag ? 3 : -1;
+    if (abort == Abort::kCheck) o->check_callback = refusing_check;
+    EXPECT_EQ(decode_on(o, {.width = 17, .height = 1023}).ok, 0);
+    if (abort == Abort::kProgress) {
+      EXPECT_EQ(log.fired_at.size(), 1u);
+      EXPECT_LE(log.check_rows.size(), 4u);
+    }
+    if (abort == Abort::kCancelFlag) {
+      EXPECT_EQ(log.check_rows.size(), 3u);
+    }
+    // The cancel flag is cleared when the next decode starts.
+    log.progress_result = 1;
+    log.stop_after_check = -1;
+    o->check_callback = logging_check;
+    const Decoded again = decode_on(o, {.width = 17, .height = 1023});
+    EXPECT_EQ(again.ok, 1);
+    EXPECT_EQ(again.buffer, reference.buffer);
+    KOLVAVETA_DestroyJpegInfo(o);
+    KOLVAVETA_DestroyDecInfo(o);
+    g_log = nullptr;
+  }
 }
 
 // Another thread sets cancel while the decode waits in its first check.
@@ -731,9 +754,11 @@ std::vector<size_t> restart_markers(const Bytes& jpeg) {
 }
 
 // Rows [from, to) of two RGBA pictures of the given width are equal.
-bool same_rows(const std::vector<uint8_t>& a, const std::vector<uint8_t>& b, int width, int from, int to) {
+bool same_rows(const std::vector<uint8_t>& a, const std::vector<uint8_t>& b, int width, int from,
+               int to) {
   const size_t row = size_t(width) * 4;
-  return std::equal(a.begin() + std::ptrdiff_t(row * size_t(from)), a.begin() + std::ptrdiff_t(row * size_t(to)),
+  return std::equal(a.begin() + std::ptrdiff_t(row * size_t(from)),
+                    a.begin() + std::ptrdiff_t(row * size_t(to)),
                     b.begin() + std::ptrdiff_t(row * size_t(from)));
 }
 
@@ -749,7 +774,8 @@ TEST(DamagedData, TruncationWithinTheLastFifteenRowsIsConcealed) {
   cases.push_back({read_fixture("base_444_rst_row_q85_48x40.jpg"), 48, 40, 8});
 #if VETAJ_HAVE_LIBJPEG
   // 4:2:0 with a last MCU row of 8 pixels (rows 32 to 39).
-  cases.push_back({encode_synthetic({.width = 64, .height = 40, .restart_interval = 4}), 64, 40, 16});
+  cases.push_back(
+      {encode_synthetic({.width = 64, .height = 40, .restart_interval = 4}), 64, 40, 16});
 #endif
   for (const Case& c : cases) {
     SCOPED_TRACE(testing::Message() << c.width << "x" << c.height);
@@ -781,14 +807,14 @@ TEST(DamagedData, TruncationWithinTheLastFifteenRowsIsConcealed) {
 // the whole picture only in its last 15 rows, and every longer cut
 // succeeds too.
 TEST(DamagedData, TruncationAnywhereFailsOrDamagesOnlyTheBottom) {
-  for (const char* fixture : {"base_444_q90_64x48.jpg", "grey_q90_64x48.jpg", "base_422_q85_64x48.jpg",
-                              "base_420_q92_17x33.jpg", "cmyk_adobe_444_q80_33x17.jpg"}) {
+  for (const char* fixture :
+       {"base_444_q90_64x48.jpg", "grey_q90_64x48.jpg", "base_422_q85_64x48.jpg",
+        "base_420_q92_17x33.jpg", "cmyk_adobe_444_q80_33x17.jpg"}) {
     SCOPED_TRACE(fixture);
-    const Bytes jpeg = read_fixture(fixture);
-    int w = 0, h = 0;
-    ASSERT_TRUE(frame_size(jpeg, &w, &h));
-    const Decoded full = decode_full(jpeg, w, h);
-    ASSERT_EQ(full.ok, 1);
+    const Whole picture = whole(fixture);
+    ASSERT_EQ(picture.decoded.ok, 1);
+    const Bytes& jpeg = picture.jpeg;
+    const int w = picture.width, h = picture.height;
     size_t sos = 0;
     for (size_t i = 0; i + 1 < jpeg.size(); ++i)
       if (jpeg[i] == 0xFF && jpeg[i + 1] == 0xDA) sos = i;
@@ -803,7 +829,8 @@ TEST(DamagedData, TruncationAnywhereFailsOrDamagesOnlyTheBottom) {
       }
       if (d.ok != 1) continue;
       succeeded = true;
-      ASSERT_TRUE(same_rows(d.buffer, full.buffer, w, 0, std::max(0, h - 15))) << "cut at " << n;
+      ASSERT_TRUE(same_rows(d.buffer, picture.decoded.buffer, w, 0, std::max(0, h - 15)))
+          << "cut at " << n;
     }
     EXPECT_TRUE(succeeded);
   }
@@ -816,8 +843,8 @@ TEST(DamagedData, TruncationAnywhereFailsOrDamagesOnlyTheBottom) {
 // (run under the sanitizers).
 TEST(DamagedData, CutsAndBitFlipsOverTheCorpus) {
   const int formats[] = {0, 1, 2, 5, 7, 8, 9, 4, 12};
-  const uint32_t fits[] = {KOLVAVETA_OPT_FIT_CENTRE, KOLVAVETA_OPT_FIT_FILL, KOLVAVETA_OPT_FIT_STRETCH,
-                           KOLVAVETA_OPT_FIT_ROWLEN};
+  const uint32_t fits[] = {KOLVAVETA_OPT_FIT_CENTRE, KOLVAVETA_OPT_FIT_FILL,
+                           KOLVAVETA_OPT_FIT_STRETCH, KOLVAVETA_OPT_FIT_ROWLEN};
   std::mt19937 rng(20240611);
   size_t turn = 0;
   std::vector<std::string> files = list_fixtures(".jpg");
@@ -863,9 +890,10 @@ TEST(DamagedData, FrameSizesThatDoNotMatchTheData) {
     int w, h;
     bool refused;
   };
-  for (const Case& c : {Case{0, 64, true}, Case{96, 0, true}, Case{50001, 8, true}, Case{8, 50001, true},
-                        Case{65535, 65535, true}, Case{96, 6400, false}, Case{4000, 64, false},
-                        Case{50000, 8, false}, Case{1, 1, false}, Case{17, 3, false}, Case{97, 65, false}}) {
+  for (const Case& c :
+       {Case{0, 64, true}, Case{96, 0, true}, Case{50001, 8, true}, Case{8, 50001, true},
+        Case{65535, 65535, true}, Case{96, 6400, false}, Case{4000, 64, false},
+        Case{50000, 8, false}, Case{1, 1, false}, Case{17, 3, false}, Case{97, 65, false}}) {
     SCOPED_TRACE(testing::Message() << c.w << "x" << c.h);
     Bytes patched = jpeg;
     const size_t sof = segment(patched, 0xC0);
@@ -875,7 +903,8 @@ TEST(DamagedData, FrameSizesThatDoNotMatchTheData) {
     patched[sof + 8] = uint8_t(c.w);
     const int bw = std::clamp(c.w, 1, 50000), bh = std::clamp(c.h, 1, 6400);
     for (const uint32_t policy : {KOLVAVETA_OPT_THUMB_NEVER, KOLVAVETA_OPT_THUMB_IF_LARGE}) {
-      const Decoded d = decode_bytes(patched, {.format = 0, .width = bw, .height = bh, .options = policy});
+      const Decoded d =
+          decode_bytes(patched, {.format = 0, .width = bw, .height = bh, .options = policy});
       EXPECT_TRUE(d.guard_intact);
       if (c.refused) {
         EXPECT_EQ(d.ok, 0);
@@ -903,7 +932,8 @@ TEST(InputKinds, EveryKindGivesTheSamePixels) {
       {"cmyk_adobe_2x2_q85_64x48.jpg", {.width = 64, .height = 48}},
       {"sample.jpg", {.format = 8, .width = 800, .height = 600}},
       {"exif_thumb_ii_640x480.jpg", {.width = 160, .height = 120, .options = 0}},
-      {"exif_thumb_portrait_ii_240x320.jpg", {.format = 0, .width = 45, .height = 60, .options = 3}},
+      {"exif_thumb_portrait_ii_240x320.jpg",
+       {.format = 0, .width = 45, .height = 60, .options = 3}},
       {"thumb_app13_jpeg_640x480.jpg", {.width = 150, .height = 100, .options = 0}},
   };
   for (const Case& c : cases) {
@@ -919,7 +949,8 @@ TEST(InputKinds, EveryKindGivesTheSamePixels) {
       EXPECT_EQ(d.ok, 1) << input_kind_name(kind);
       EXPECT_EQ(d.buffer, reference.buffer) << input_kind_name(kind);
       // A second decode on the same object reads the input again.
-      EXPECT_EQ(decode_on(input.object(), c.request).buffer, reference.buffer) << input_kind_name(kind);
+      EXPECT_EQ(decode_on(input.object(), c.request).buffer, reference.buffer)
+          << input_kind_name(kind);
     }
   }
 }
@@ -935,7 +966,8 @@ TEST(InputKinds, StreamInsideAContainerDecodesFromItsOffset) {
     const size_t offset = size_t(entry->number("jpeg_offset"));
     const size_t length = size_t(entry->number("jpeg_length"));
     ASSERT_LE(offset + length, file.size());
-    const Bytes inner(file.begin() + std::ptrdiff_t(offset), file.begin() + std::ptrdiff_t(offset + length));
+    const Bytes inner(file.begin() + std::ptrdiff_t(offset),
+                      file.begin() + std::ptrdiff_t(offset + length));
     for (const uint32_t options : {0x0u, 0x1u, 0x1004u, 0x0308u}) {
       const DecodeRequest r{.format = 0, .width = 60, .height = 50, .options = options};
       const Decoded reference = decode_bytes(inner, r);
@@ -990,10 +1022,14 @@ enum class Space { kGrey, kRgb, kYcc, kCmyk, kYcck };
 Colour interpret(Space space, const OraclePlanes& p, int x, int y) {
   auto s = [&](int c) { return int(p.at(x, y, c)); };
   switch (space) {
-    case Space::kGrey: return {false, s(0), s(0), s(0)};
-    case Space::kRgb: return {false, s(0), s(1), s(2)};
-    case Space::kYcc: return {true, s(0), s(1), s(2)};
-    case Space::kCmyk: return {false, s(0) * s(3) / 255, s(1) * s(3) / 255, s(2) * s(3) / 255};
+    case Space::kGrey:
+      return {false, s(0), s(0), s(0)};
+    case Space::kRgb:
+      return {false, s(0), s(1), s(2)};
+    case Space::kYcc:
+      return {true, s(0), s(1), s(2)};
+    case Space::kCmyk:
+      return {false, s(0) * s(3) / 255, s(1) * s(3) / 255, s(2) * s(3) / 255};
     case Space::kYcck: {
       // The YCbCr equations inverted, the 128 offsets folded into the
       // constants, black applied by k / 256.
@@ -1021,21 +1057,27 @@ TEST(ColourSpaces, DetectedFromComponentsAndMarkers) {
       {"grey", "grey_q90_64x48.jpg", unchanged, Space::kGrey},
       {"adobe_0_rgb", "rgb_adobe_q90_64x48.jpg", unchanged, Space::kRgb},
       {"adobe_0_rgb_whatever_ids", "rgb_adobe_q90_64x48.jpg",
-       [](Bytes b) { return with_component_ids(b, {1, 2, 3}); }, Space::kRgb},
+       [](Bytes b) {
+         return with_component_ids(b, {1, 2, 3});
+       },
+       Space::kRgb},
       {"adobe_1_ycc", "rgb_adobe_q90_64x48.jpg", [](Bytes b) { return with_adobe_transform(b, 1); },
        Space::kYcc},
       {"ids_rgb", "rgb_ids_rgb_nomarker_q90_64x48.jpg", unchanged, Space::kRgb},
       {"app0_ycc", "base_444_q90_64x48.jpg", unchanged, Space::kYcc},
       {"app0_wins_over_rgb_ids", "base_444_q90_64x48.jpg",
-       [](Bytes b) { return with_component_ids(b, {'R', 'G', 'B'}); }, Space::kYcc},
+       [](Bytes b) {
+         return with_component_ids(b, {'R', 'G', 'B'});
+       },
+       Space::kYcc},
       {"ids_012", "base_ids012_nomarker_q85_64x48.jpg", unchanged, Space::kYcc},
       {"ids_123", "base_ids123_nomarker_q85_64x48.jpg", unchanged, Space::kYcc},
       {"adobe_0_cmyk", "cmyk_adobe_444_q90_64x48.jpg", unchanged, Space::kCmyk},
       {"adobe_2_ycck_from_cmyk", "cmyk_adobe_444_q90_64x48.jpg",
        [](Bytes b) { return with_adobe_transform(b, 2); }, Space::kYcck},
       {"adobe_2_ycck", "ycck_adobe_444_q90_64x48.jpg", unchanged, Space::kYcck},
-      {"adobe_1_ycck", "ycck_adobe_444_q90_64x48.jpg", [](Bytes b) { return with_adobe_transform(b, 1); },
-       Space::kYcck},
+      {"adobe_1_ycck", "ycck_adobe_444_q90_64x48.jpg",
+       [](Bytes b) { return with_adobe_transform(b, 1); }, Space::kYcck},
       {"adobe_0_cmyk_from_ycck", "ycck_adobe_444_q90_64x48.jpg",
        [](Bytes b) { return with_adobe_transform(b, 0); }, Space::kCmyk},
   };
@@ -1047,10 +1089,10 @@ TEST(ColourSpaces, DetectedFromComponentsAndMarkers) {
     const Decoded d = decode_full(jpeg, raw.width, raw.height);
     ASSERT_EQ(d.ok, 1) << d.error;
     const Placement where = centred(7, raw.width, raw.height, raw.width, raw.height);
-    EXPECT_TRUE(same_output(d.buffer, expected_buffer(where, [&](int x, int y) {
-                              return interpret(c.space, raw, x, y);
-                            }),
-                            where));
+    EXPECT_TRUE(same_output(
+        d.buffer,
+        expected_buffer(where, [&](int x, int y) { return interpret(c.space, raw, x, y); }),
+        where));
   }
 }
 
@@ -1086,10 +1128,13 @@ TEST(ColourSpaces, GreyInEveryFormat) {
 // nothing and keep no memory.
 TEST(ColourSpaces, UndecidableFramesAreRejected) {
   const std::pair<const char*, Bytes> cases[] = {
-      {"four_components_without_adobe", without_segment(read_fixture("cmyk_adobe_444_q90_64x48.jpg"), 0xEE)},
+      {"four_components_without_adobe",
+       without_segment(read_fixture("cmyk_adobe_444_q90_64x48.jpg"), 0xEE)},
       {"two_components", without_last_component(read_fixture("base_444_q90_64x48.jpg"))},
-      {"unknown_ids", with_component_ids(read_fixture("base_ids123_nomarker_q85_64x48.jpg"), {4, 5, 6})},
-      {"adobe_2_with_three_components", with_adobe_transform(read_fixture("rgb_adobe_q90_64x48.jpg"), 2)},
+      {"unknown_ids",
+       with_component_ids(read_fixture("base_ids123_nomarker_q85_64x48.jpg"), {4, 5, 6})},
+      {"adobe_2_with_three_components",
+       with_adobe_transform(read_fixture("rgb_adobe_q90_64x48.jpg"), 2)},
   };
   for (const auto& [label, jpeg] : cases) {
     for (const uint32_t policy : {KOLVAVETA_OPT_THUMB_NEVER, KOLVAVETA_OPT_THUMB_IF_LARGE}) {
@@ -1125,7 +1170,8 @@ TEST(Errors, ArgumentsAndInputsThatCannotDecode) {
                                        uint32_t(good.size()), KOLVAVETA_FMT_RGBA8888,
                                        KOLVAVETA_OPT_THUMB_NEVER);
   ASSERT_NE(o, nullptr);
-  for (const auto& [w, h] : {std::pair{0, 64}, std::pair{96, 0}, std::pair{-5, 64}, std::pair{96, -1}})
+  for (const auto& [w, h] :
+       {std::pair{0, 64}, std::pair{96, 0}, std::pair{-5, 64}, std::pair{96, -1}})
     EXPECT_EQ(KOLVAVETA_DecodeJPEG(o, buffer.data(), w, h), 0) << w << "x" << h;
   EXPECT_EQ(KOLVAVETA_DecodeJPEG(o, nullptr, 96, 64), 0);
   EXPECT_TRUE(std::all_of(buffer.begin(), buffer.end(), [](uint8_t b) { return b == kFill; }));
@@ -1134,8 +1180,8 @@ TEST(Errors, ArgumentsAndInputsThatCannotDecode) {
   KOLVAVETA_DestroyJpegInfo(o);
   KOLVAVETA_DestroyDecInfo(o);
 
-  Bytes png = {0x89, 'P', 'N', 'G', 0x0D, 0x0A, 0x1A, 0x0A, 0, 0, 0, 13, 'I', 'H', 'D', 'R',
-               0, 0, 0, 16, 0, 0, 0, 16, 8, 2, 0, 0, 0};
+  Bytes png = {0x89, 'P', 'N', 'G', 0x0D, 0x0A, 0x1A, 0x0A, 0,  0, 0, 13, 'I', 'H', 'D',
+               'R',  0,   0,   0,   16,   0,    0,    0,    16, 8, 2, 0,  0,   0};
   png.resize(200, 0x11);
   std::mt19937 rng(7);
   Bytes noise(4000);
@@ -1160,7 +1206,8 @@ TEST(Errors, ArgumentsAndInputsThatCannotDecode) {
         EXPECT_EQ(d.error, KOLVAVETA_ERR_SETUP);
       }
       EXPECT_TRUE(d.guard_intact);
-      EXPECT_TRUE(std::all_of(d.buffer.begin(), d.buffer.end(), [](uint8_t b) { return b == kFill; }));
+      EXPECT_TRUE(
+          std::all_of(d.buffer.begin(), d.buffer.end(), [](uint8_t b) { return b == kFill; }));
     }
   }
 }

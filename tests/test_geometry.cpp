@@ -22,16 +22,26 @@ using namespace vjtest;
 
 const char* format_name(int format) {
   switch (format) {
-    case 0: return "RGB565";
-    case 1: return "RGB888";
-    case 2: return "YUV420";
-    case 5: return "ARGB";
-    case 7: return "RGBA";
-    case 8: return "BGRA";
-    case 3: return "RGB888_3";
-    case 9: return "RGB565_9";
-    case 12: return "RGBA_12";
-    default: return "other";
+    case 0:
+      return "RGB565";
+    case 1:
+      return "RGB888";
+    case 2:
+      return "YUV420";
+    case 5:
+      return "ARGB";
+    case 7:
+      return "RGBA";
+    case 8:
+      return "BGRA";
+    case 3:
+      return "RGB888_3";
+    case 9:
+      return "RGB565_9";
+    case 12:
+      return "RGBA_12";
+    default:
+      return "other";
   }
 }
 
@@ -61,8 +71,8 @@ TEST_P(Placed, FullSizeInExactAndLargerBuffers) {
   const bool quarter = rotation == KOLVAVETA_OPT_ROTATE_90 || rotation == KOLVAVETA_OPT_ROTATE_270;
   for (const char* fixture :
        {"base_420_q90_96x64.jpg", "base_420_q95_63x65.jpg", "base_422_q85_64x48.jpg",
-        "base_440_q80_64x48.jpg", "base_444_q89_7x9.jpg", "base_420_q75_1x1.jpg", "base_420_q82_2x2.jpg",
-        "grey_q95_1x1.jpg", "grey_q85_33x17.jpg", "rgb_adobe_q85_33x17.jpg",
+        "base_440_q80_64x48.jpg", "base_444_q89_7x9.jpg", "base_420_q75_1x1.jpg",
+        "base_420_q82_2x2.jpg", "grey_q95_1x1.jpg", "grey_q85_33x17.jpg", "rgb_adobe_q85_33x17.jpg",
         "cmyk_adobe_444_q80_33x17.jpg", "ycck_adobe_444_q90_64x48.jpg"}) {
     SCOPED_TRACE(fixture);
     const Source src = load(fixture);
@@ -116,10 +126,10 @@ INSTANTIATE_TEST_SUITE_P(
 
 struct FitCase {
   const char* label;
-  uint32_t options;          // fit mode and rotation
-  int buffer_w, buffer_h;    // requested size
-  int out_w, out_h;          // output_width and output_height reported
-  int vis_w, vis_h;          // visible size before rotation
+  uint32_t options;                     // fit mode and rotation
+  int buffer_w, buffer_h;               // requested size
+  int out_w, out_h;                     // output_width and output_height reported
+  int vis_w, vis_h;                     // visible size before rotation
   int src_left, src_top, src_w, src_h;  // source window that is resized onto it
   Sampling sampling;
   // Placement: centred in the buffer, at its top-left corner, or at its
@@ -130,29 +140,47 @@ struct FitCase {
 // The 96x64 4:2:0 fixture. Outputs of at most 99x99 pixels take centre
 // sampling, larger ones the quarter-point averages.
 const FitCase kFitCases[] = {
-    {"fit_inside_centred", 0x000, 80, 80, 80, 53, 80, 53, 0, 0, 96, 64, Sampling::kCentre, FitCase::kCentred},
-    {"modes_4_to_6_as_0", 0x500, 80, 80, 80, 53, 80, 53, 0, 0, 96, 64, Sampling::kCentre, FitCase::kCentred},
-    {"smaller_picture_centred", 0x000, 120, 90, 96, 64, 96, 64, 0, 0, 96, 64, Sampling::kCentre, FitCase::kCentred},
-    {"smaller_picture_not_filled", 0x300, 120, 90, 96, 64, 96, 64, 0, 0, 96, 64, Sampling::kCentre, FitCase::kCentred},
-    {"row_length_own_size", 0x100, 100, 90, 96, 64, 96, 64, 0, 0, 96, 64, Sampling::kCentre, FitCase::kRowLength},
-    {"row_length_resized", 0x100, 80, 70, 80, 53, 80, 53, 0, 0, 96, 64, Sampling::kCentre, FitCase::kRowLength},
-    {"top_left_own_size", 0x200, 100, 90, 96, 64, 96, 64, 0, 0, 96, 64, Sampling::kCentre, FitCase::kTopLeft},
-    {"top_left_resized", 0x200, 80, 80, 80, 53, 80, 53, 0, 0, 96, 64, Sampling::kCentre, FitCase::kTopLeft},
+    {"fit_inside_centred", 0x000, 80, 80, 80, 53, 80, 53, 0, 0, 96, 64, Sampling::kCentre,
+     FitCase::kCentred},
+    {"modes_4_to_6_as_0", 0x500, 80, 80, 80, 53, 80, 53, 0, 0, 96, 64, Sampling::kCentre,
+     FitCase::kCentred},
+    {"smaller_picture_centred", 0x000, 120, 90, 96, 64, 96, 64, 0, 0, 96, 64, Sampling::kCentre,
+     FitCase::kCentred},
+    {"smaller_picture_not_filled", 0x300, 120, 90, 96, 64, 96, 64, 0, 0, 96, 64, Sampling::kCentre,
+     FitCase::kCentred},
+    {"row_length_own_size", 0x100, 100, 90, 96, 64, 96, 64, 0, 0, 96, 64, Sampling::kCentre,
+     FitCase::kRowLength},
+    {"row_length_resized", 0x100, 80, 70, 80, 53, 80, 53, 0, 0, 96, 64, Sampling::kCentre,
+     FitCase::kRowLength},
+    {"top_left_own_size", 0x200, 100, 90, 96, 64, 96, 64, 0, 0, 96, 64, Sampling::kCentre,
+     FitCase::kTopLeft},
+    {"top_left_resized", 0x200, 80, 80, 80, 53, 80, 53, 0, 0, 96, 64, Sampling::kCentre,
+     FitCase::kTopLeft},
     // Fill: 60 wide gives 40 rows, too few; 60 rows give 90 columns, of
     // which the middle (64 of 96 source columns, from column 16) is shown.
-    {"fill_crops_width", 0x300, 60, 60, 90, 60, 60, 60, 16, 0, 64, 64, Sampling::kCentre, FitCase::kCentred},
-    {"stretch_up", 0x700, 120, 120, 120, 120, 120, 120, 0, 0, 96, 64, Sampling::kAverage, FitCase::kCentred},
-    {"stretch_down", 0x700, 70, 30, 70, 30, 70, 30, 0, 0, 96, 64, Sampling::kCentre, FitCase::kCentred},
-    {"stretch_same_size", 0x700, 96, 64, 96, 64, 96, 64, 0, 0, 96, 64, Sampling::kCentre, FitCase::kCentred},
+    {"fill_crops_width", 0x300, 60, 60, 90, 60, 60, 60, 16, 0, 64, 64, Sampling::kCentre,
+     FitCase::kCentred},
+    {"stretch_up", 0x700, 120, 120, 120, 120, 120, 120, 0, 0, 96, 64, Sampling::kAverage,
+     FitCase::kCentred},
+    {"stretch_down", 0x700, 70, 30, 70, 30, 70, 30, 0, 0, 96, 64, Sampling::kCentre,
+     FitCase::kCentred},
+    {"stretch_same_size", 0x700, 96, 64, 96, 64, 96, 64, 0, 0, 96, 64, Sampling::kCentre,
+     FitCase::kCentred},
     // Rotated requests swap the requested size before fitting.
-    {"fit_rotated_90", 0x004, 53, 80, 80, 53, 80, 53, 0, 0, 96, 64, Sampling::kCentre, FitCase::kCentred},
-    {"fill_rotated_270", 0x30C, 60, 60, 90, 60, 60, 60, 16, 0, 64, 64, Sampling::kCentre, FitCase::kCentred},
-    {"stretch_rotated_180", 0x708, 120, 110, 120, 110, 120, 110, 0, 0, 96, 64, Sampling::kAverage, FitCase::kCentred},
-    {"top_left_rotated_90", 0x204, 90, 100, 96, 64, 96, 64, 0, 0, 96, 64, Sampling::kCentre, FitCase::kTopLeft},
-    {"row_length_rotated_90", 0x104, 100, 100, 96, 64, 96, 64, 0, 0, 96, 64, Sampling::kCentre, FitCase::kRowLength},
+    {"fit_rotated_90", 0x004, 53, 80, 80, 53, 80, 53, 0, 0, 96, 64, Sampling::kCentre,
+     FitCase::kCentred},
+    {"fill_rotated_270", 0x30C, 60, 60, 90, 60, 60, 60, 16, 0, 64, 64, Sampling::kCentre,
+     FitCase::kCentred},
+    {"stretch_rotated_180", 0x708, 120, 110, 120, 110, 120, 110, 0, 0, 96, 64, Sampling::kAverage,
+     FitCase::kCentred},
+    {"top_left_rotated_90", 0x204, 90, 100, 96, 64, 96, 64, 0, 0, 96, 64, Sampling::kCentre,
+     FitCase::kTopLeft},
+    {"row_length_rotated_90", 0x104, 100, 100, 96, 64, 96, 64, 0, 0, 96, 64, Sampling::kCentre,
+     FitCase::kRowLength},
     // Fill with the picture narrower than the buffer but taller: centred
     // across, 50 of its 64 rows shown from row 7.
-    {"fill_crops_height_only", 0x300, 120, 50, 96, 64, 96, 50, 0, 7, 96, 50, Sampling::kCentre, FitCase::kCentred},
+    {"fill_crops_height_only", 0x300, 120, 50, 96, 64, 96, 50, 0, 7, 96, 50, Sampling::kCentre,
+     FitCase::kCentred},
 };
 
 void PrintTo(const FitCase& c, std::ostream* os) { *os << c.label; }
@@ -162,8 +190,8 @@ class FitModes : public ::testing::TestWithParam<std::tuple<FitCase, int>> {};
 // The buffer a fit case should leave.
 std::vector<uint8_t> expected_fit(const FitCase& c, int format, const FullPicture& full) {
   const uint32_t rotation = c.options & KOLVAVETA_OPT_ROTATE_MASK;
-  const ColourAt colour = resampled(full.at, c.sampling, c.src_left, c.src_top, c.src_w, c.src_h,
-                                    c.vis_w, c.vis_h);
+  const ColourAt colour =
+      resampled(full.at, c.sampling, c.src_left, c.src_top, c.src_w, c.src_h, c.vis_w, c.vis_h);
   Placement where = Placement::centred(format, c.buffer_w, c.buffer_h, c.vis_w, c.vis_h, rotation);
   if (c.where == FitCase::kCentred) return expected_buffer(where, colour);
   where.left = where.top = 0;
@@ -198,20 +226,21 @@ TEST_P(FitModes, PlaceAndResampleTheVisiblePicture) {
   EXPECT_TRUE(same_output(d.buffer, expected_fit(c, format, src.full), where));
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    Cases, FitModes,
-    ::testing::Combine(::testing::ValuesIn(kFitCases),
-                       ::testing::Values(KOLVAVETA_FMT_RGBA8888, KOLVAVETA_FMT_RGB565,
-                                         KOLVAVETA_FMT_YUV420)),
-    [](const ::testing::TestParamInfo<std::tuple<FitCase, int>>& param) {
-      return std::string(std::get<0>(param.param).label) + "_" +
-             format_name(std::get<1>(param.param));
-    });
+INSTANTIATE_TEST_SUITE_P(Cases, FitModes,
+                         ::testing::Combine(::testing::ValuesIn(kFitCases),
+                                            ::testing::Values(KOLVAVETA_FMT_RGBA8888,
+                                                              KOLVAVETA_FMT_RGB565,
+                                                              KOLVAVETA_FMT_YUV420)),
+                         [](const ::testing::TestParamInfo<std::tuple<FitCase, int>>& param) {
+                           return std::string(std::get<0>(param.param).label) + "_" +
+                                  format_name(std::get<1>(param.param));
+                         });
 
 // Format 4 is accepted and only counts rows: whatever the geometry, the
 // decode succeeds and writes nothing.
 TEST(FitModes, CountOnlyFormatWritesNothing) {
-  for (const char* fixture : {"base_420_q90_96x64.jpg", "grey_q85_33x17.jpg", "cmyk_adobe_2x2_q85_64x48.jpg"}) {
+  for (const char* fixture :
+       {"base_420_q90_96x64.jpg", "grey_q85_33x17.jpg", "cmyk_adobe_2x2_q85_64x48.jpg"}) {
     SCOPED_TRACE(fixture);
     const Bytes jpeg = read_fixture(fixture);
     for (const uint32_t options : {0x001u, 0x005u, 0x30Bu, 0x70Du, 0x101u}) {
@@ -239,8 +268,9 @@ TEST(FillMode, CropsHalfTheOverhangOnEachSide) {
   struct Case {
     int w, h, buffer, out_w, out_h, left, top, window;
   };
-  for (const Case& c : {Case{400, 300, 200, 267, 200, 50, 0, 300}, Case{300, 400, 200, 200, 267, 0, 50, 300},
-                        Case{303, 200, 100, 152, 100, 51, 0, 200}}) {
+  for (const Case& c :
+       {Case{400, 300, 200, 267, 200, 50, 0, 300}, Case{300, 400, 200, 200, 267, 0, 50, 300},
+        Case{303, 200, 100, 152, 100, 51, 0, 200}}) {
     SCOPED_TRACE(testing::Message() << c.w << "x" << c.h);
     SyntheticSpec spec;
     spec.width = c.w;
@@ -258,10 +288,11 @@ TEST(FillMode, CropsHalfTheOverhangOnEachSide) {
       EXPECT_EQ(d.output_width, c.out_w);
       EXPECT_EQ(d.output_height, c.out_h);
       const Placement where = Placement::centred(format, c.buffer, c.buffer, c.buffer, c.buffer);
-      EXPECT_TRUE(same_output(d.buffer,
-                              expected_buffer(where, resampled(full.at, Sampling::kAverage, c.left, c.top,
-                                                               c.window, c.window, c.buffer, c.buffer)),
-                              where));
+      EXPECT_TRUE(
+          same_output(d.buffer,
+                      expected_buffer(where, resampled(full.at, Sampling::kAverage, c.left, c.top,
+                                                       c.window, c.window, c.buffer, c.buffer)),
+                      where));
     }
   }
 }
@@ -279,7 +310,8 @@ TEST(ReducedGeometry, OutputSizeAndPlacement) {
   int not_decoded = 0;
   for (const Case& c : {Case{0x000, 40, 40, 40, 27}, Case{0x700, 30, 20, 30, 20},
                         Case{0x300, 40, 40, 60, 40}, Case{0x004, 27, 40, 40, 27}}) {
-    SCOPED_TRACE(testing::Message() << "options " << c.options << " " << c.buffer_w << "x" << c.buffer_h);
+    SCOPED_TRACE(testing::Message()
+                 << "options " << c.options << " " << c.buffer_w << "x" << c.buffer_h);
     DecodeRequest r;
     r.width = c.buffer_w;
     r.height = c.buffer_h;
@@ -336,7 +368,8 @@ TEST(WholeBufferRotation, QuarterTurnsMovePixelsAndUndoEachOther) {
   EXPECT_EQ(VETAJ_RotateImage90(untouched.data(), 4, 4, 13), 0);
   EXPECT_EQ(VETAJ_RotateImage270(nullptr, 4, 4, 0), 0);
   EXPECT_EQ(VETAJ_RotateImage90(untouched.data(), 0, 4, 0), 0);
-  EXPECT_TRUE(std::all_of(untouched.begin(), untouched.end(), [](uint8_t b) { return b == kFill; }));
+  EXPECT_TRUE(
+      std::all_of(untouched.begin(), untouched.end(), [](uint8_t b) { return b == kFill; }));
 }
 
 }  // namespace

@@ -97,7 +97,8 @@ bool full_picture(const Bytes& jpeg, FullPicture* out) {
   out->height = info.height;
   const int row = info.width;
   out->at = [rgba, row](int x, int y) {
-    return load_pixel(KOLVAVETA_FMT_RGBA8888, &rgba->buffer[(size_t(y) * size_t(row) + size_t(x)) * 4]);
+    return load_pixel(KOLVAVETA_FMT_RGBA8888,
+                      &rgba->buffer[(size_t(y) * size_t(row) + size_t(x)) * 4]);
   };
   return true;
 }

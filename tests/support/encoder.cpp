@@ -13,11 +13,15 @@ namespace {
 // Sample c of pixel (x, y): diagonal gradients, a bright disc, a grid of
 // dark bars and a little hashed noise.
 uint8_t sample(const SyntheticSpec& s, int x, int y, int c) {
-  int v = c == 0 ? x * 255 / s.width : c == 1 ? y * 255 / s.height : (x + y) * 127 / (s.width + s.height);
-  const int dx = x - s.width / 3, dy = y - s.height / 2, r = (s.width < s.height ? s.width : s.height) / 4;
+  int v = c == 0   ? x * 255 / s.width
+          : c == 1 ? y * 255 / s.height
+                   : (x + y) * 127 / (s.width + s.height);
+  const int dx = x - s.width / 3, dy = y - s.height / 2,
+            r = (s.width < s.height ? s.width : s.height) / 4;
   if (dx * dx + dy * dy < r * r) v = 230 - 40 * c;
   if ((x / 7) % 5 == 0 && (y / 3) % 4 != 0) v /= 3;
-  uint32_t h = uint32_t(x) * 73856093u ^ uint32_t(y) * 19349663u ^ (s.seed + uint32_t(c)) * 83492791u;
+  uint32_t h =
+      uint32_t(x) * 73856093u ^ uint32_t(y) * 19349663u ^ (s.seed + uint32_t(c)) * 83492791u;
   h ^= h >> 13;
   v += int(h % 17) - 8;
   return uint8_t(v < 0 ? 0 : v > 255 ? 255 : v);

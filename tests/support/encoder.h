@@ -15,7 +15,7 @@ struct SyntheticSpec {
   int components = 3;          // 1 (grey) or 3 (YCbCr with a JFIF marker)
   int h_samp = 2, v_samp = 2;  // luma sampling factors; chroma is 1x1
   int quality = 90;
-  int restart_interval = 0;    // in MCUs
+  int restart_interval = 0;  // in MCUs
   uint32_t seed = 1;
 };
 

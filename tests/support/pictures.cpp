@@ -13,9 +13,12 @@ constexpr int kPixelBytes[13] = {2, 3, 1, 3, 0, 4, 3, 4, 4, 2, 2, 3, 4};
 // Memory order of the four-byte formats: 'R', 'G', 'B' or 'A' per byte.
 const char* quad_order(int format) {
   switch (format) {
-    case 5: return "ARGB";
-    case 8: return "BGRA";
-    default: return "RGBA";
+    case 5:
+      return "ARGB";
+    case 8:
+      return "BGRA";
+    default:
+      return "RGBA";
   }
 }
 
@@ -24,8 +27,7 @@ const char* quad_order(int format) {
 Rgb rgb_of(const Colour& c) {
   if (!c.ycc) return {c.a, c.b, c.c};
   const int64_t cb = c.b - 128, cr = c.c - 128;
-  return {clamp255(c.a + ((91881 * cr) >> 16)),
-          clamp255(c.a + ((-22554 * cb - 46802 * cr) >> 16)),
+  return {clamp255(c.a + ((91881 * cr) >> 16)), clamp255(c.a + ((-22554 * cb - 46802 * cr) >> 16)),
           clamp255(c.a + ((116130 * cb) >> 16))};
 }
 
@@ -61,7 +63,10 @@ void store_pixel(int format, const Rgb& c, uint8_t* at) {
     case 4: {
       const char* order = quad_order(format);
       for (int i = 0; i < 4; ++i)
-        at[i] = uint8_t(order[i] == 'R' ? c.r : order[i] == 'G' ? c.g : order[i] == 'B' ? c.b : 255);
+        at[i] = uint8_t(order[i] == 'R'   ? c.r
+                        : order[i] == 'G' ? c.g
+                        : order[i] == 'B' ? c.b
+                                          : 255);
       return;
     }
     default:
@@ -153,7 +158,8 @@ std::vector<uint8_t> expected_buffer(const Placement& p, const ColourAt& colour)
       size_t chroma = SIZE_MAX;
       if (p.rotation == 0 && x % 2 == 0 && y % 2 == 0)
         chroma = (size_t(p.top / 2) + size_t(y / 2)) * cs + size_t(p.left / 2) + size_t(x / 2);
-      if (p.rotation != 0 && bx % 2 == 0 && by % 2 == 0) chroma = size_t(by / 2) * cs + size_t(bx / 2);
+      if (p.rotation != 0 && bx % 2 == 0 && by % 2 == 0)
+        chroma = size_t(by / 2) * cs + size_t(bx / 2);
       if (chroma != SIZE_MAX) {
         u[chroma] = uint8_t(yuv.b);
         v[chroma] = uint8_t(yuv.c);
@@ -179,15 +185,18 @@ std::vector<uint8_t> expected_buffer(const Placement& p, const ColourAt& colour)
     const size_t luma = bw * bh, cs = (bw + 1) / 2, plane = cs * ((bh + 1) / 2);
     const size_t in_plane = first < luma ? first : (first - luma) % plane;
     const size_t row_length = first < luma ? bw : cs;
-    where = std::string(first < luma ? "Y" : (first - luma) < plane ? "U" : "V") + " plane (" +
-            std::to_string(in_plane % row_length) + "," + std::to_string(in_plane / row_length) + ")";
+    where = std::string(first < luma             ? "Y"
+                        : (first - luma) < plane ? "U"
+                                                 : "V") +
+            " plane (" + std::to_string(in_plane % row_length) + "," +
+            std::to_string(in_plane / row_length) + ")";
   } else {
     const size_t px = first / size_t(std::max(1, pixel_bytes(p.format)));
     where = "pixel (" + std::to_string(px % bw) + "," + std::to_string(px / bw) + ")";
   }
-  return ::testing::AssertionFailure() << diffs << " bytes differ; first at " << where << ": "
-                                       << int(actual[first]) << " instead of "
-                                       << int(expected[first]);
+  return ::testing::AssertionFailure()
+         << diffs << " bytes differ; first at " << where << ": " << int(actual[first])
+         << " instead of " << int(expected[first]);
 }
 
 ColourAt resampled(const ColourAt& source, Sampling sampling, int left, int top, int sw, int sh,

@@ -5,13 +5,13 @@
 #ifndef VETAJ_TESTS_SUPPORT_PICTURES_H
 #define VETAJ_TESTS_SUPPORT_PICTURES_H
 
+#include <gtest/gtest.h>
+
 #include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <string>
 #include <vector>
-
-#include <gtest/gtest.h>
 
 namespace vjtest {
 
