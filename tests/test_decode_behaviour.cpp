@@ -398,57 +398,41 @@ TEST(Thumbnails, OrientedPolicyTurnsALandscapeThumbnailOfAPortraitPicture) {
                           centred(7, 60, 45, 60, 45)));
 }
 
-// A sample size compares the thumbnail with the picture divided by it (the
-// picture size comes from a header summary) and becomes 1 when the
-// thumbnail is taken.
+// A sample size compares the thumbnail with the main picture divided by it
+// and becomes 1 when the thumbnail is taken. The main picture's size comes
+// from the header that the decode reads: the choice is the same with or
+// without a header summary, and after a thumbnail decode has left the
+// thumbnail's size in the object.
 TEST(Thumbnails, SampleSizeSelectsTheThumbnail) {
   const Pictures p = load_with_thumbnail("exif_thumb_ii_640x480.jpg", 160, 120);
   DecInfo* o = KOLVAVETA_CreateDecInfo(KOLVAVETA_IO_MEMORY, const_cast<uint8_t*>(p.file.data()),
                                        uint32_t(p.file.size()), KOLVAVETA_FMT_RGBA8888, 0);
   ASSERT_NE(o, nullptr);
   JpegInfo info{};
-  ASSERT_EQ(KOLVAVETA_JpgParser(o, &info), 1);
-  const Decoded d = decode_on(o, {.width = 640, .height = 480, .options = 0, .sample_size = 4});
-  EXPECT_EQ(d.ok, 1) << d.error;
-  EXPECT_EQ(d.sample_size, 1u);
-  EXPECT_EQ(d.output_width, 160);
-  EXPECT_EQ(d.output_height, 120);
-  EXPECT_TRUE(same_output(d.buffer,
-                          expected_picture(p.thumb, Sampling::kCentre, 7, 640, 480, 160, 120),
-                          centred(7, 640, 480, 160, 120)));
+  for (const bool summary : {true, false}) {
+    for (const uint32_t policy :
+         {KOLVAVETA_OPT_THUMB_IF_LARGE, KOLVAVETA_OPT_THUMB_ALWAYS, KOLVAVETA_OPT_THUMB_IF_LARGE}) {
+      SCOPED_TRACE(testing::Message() << "summary " << summary << " policy " << policy);
+      if (summary) {
+        ASSERT_EQ(KOLVAVETA_JpgParser(o, &info), 1);
+      }
+      const Decoded d =
+          decode_on(o, {.width = 640, .height = 480, .options = policy, .sample_size = 4});
+      EXPECT_EQ(d.ok, 1) << d.error;
+      EXPECT_EQ(d.sample_size, 1u);
+      EXPECT_EQ(d.output_width, 160);
+      EXPECT_EQ(d.output_height, 120);
+      EXPECT_TRUE(same_output(d.buffer,
+                              expected_picture(p.thumb, Sampling::kCentre, 7, 640, 480, 160, 120),
+                              centred(7, 640, 480, 160, 120)));
+    }
+  }
   // Divided by 2 the picture is larger than the thumbnail: the main picture
   // at 320x240 (which needs the reduced transform), sample size kept.
-  ASSERT_EQ(KOLVAVETA_JpgParser(o, &info), 1);
   const Decoded main = decode_on(o, {.width = 640, .height = 480, .options = 0, .sample_size = 2});
   EXPECT_EQ(main.sample_size, 2u);
   EXPECT_EQ(main.output_width, 320);
   EXPECT_EQ(main.output_height, 240);
-  KOLVAVETA_DestroyJpegInfo(o);
-  KOLVAVETA_DestroyDecInfo(o);
-}
-
-// The picture that a sample size divides is the main picture whose header
-// the decode reads: without a header summary, and again after a thumbnail
-// decode has left the thumbnail's size in the object, the thumbnail is
-// chosen as with the summary.
-TEST(Thumbnails, SampleSizeDividesTheMainPictureWithoutASummary) {
-  const Pictures p = load_with_thumbnail("exif_thumb_ii_640x480.jpg", 160, 120);
-  DecInfo* o = KOLVAVETA_CreateDecInfo(KOLVAVETA_IO_MEMORY, const_cast<uint8_t*>(p.file.data()),
-                                       uint32_t(p.file.size()), KOLVAVETA_FMT_RGBA8888, 0);
-  ASSERT_NE(o, nullptr);
-  for (const uint32_t policy :
-       {KOLVAVETA_OPT_THUMB_IF_LARGE, KOLVAVETA_OPT_THUMB_ALWAYS, KOLVAVETA_OPT_THUMB_IF_LARGE}) {
-    SCOPED_TRACE(testing::Message() << "policy " << policy);
-    const Decoded d =
-        decode_on(o, {.width = 640, .height = 480, .options = policy, .sample_size = 4});
-    EXPECT_EQ(d.ok, 1) << d.error;
-    EXPECT_EQ(d.sample_size, 1u);
-    EXPECT_EQ(d.output_width, 160);
-    EXPECT_EQ(d.output_height, 120);
-    EXPECT_TRUE(same_output(d.buffer,
-                            expected_picture(p.thumb, Sampling::kCentre, 7, 640, 480, 160, 120),
-                            centred(7, 640, 480, 160, 120)));
-  }
   KOLVAVETA_DestroyJpegInfo(o);
   KOLVAVETA_DestroyDecInfo(o);
 }
