@@ -85,7 +85,8 @@ Bytes with_component_ids(Bytes jpeg, std::initializer_list<uint8_t> ids) {
 }
 
 Bytes with_adobe_transform(Bytes jpeg, uint8_t transform) {
-  jpeg[segment(jpeg, 0xEE) + 15] = transform;
+  const size_t at = segment(jpeg, 0xEE);
+  if (at < jpeg.size() && jpeg.size() - at > 15) jpeg[at + 15] = transform;
   return jpeg;
 }
 
