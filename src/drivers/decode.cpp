@@ -43,8 +43,10 @@ int32_t VETAJ_ProcessData(DecoderInfo* d, uint8_t* output, uint32_t* row_ctr,
   int32_t status = 0;
   if (ctl.buffer_full == 0) {
     if (ctl.finished != 0) return vj::kStatusEnd;
+    // The callback sees the output rows written so far: the progress
+    // percentage divides them by the output height.
     if (d->check_callback != nullptr &&
-        d->check_callback(d->owner, static_cast<int32_t>(rows_consumed(d))) == 0)
+        d->check_callback(d->owner, static_cast<int32_t>(d->output_rows)) == 0)
       return vj::kStatusFail;
     uint8_t** lists[4];
     for (uint32_t ci = 0; ci < d->num_components; ++ci)
@@ -293,14 +295,20 @@ extern "C" VETAJ_API int32_t KOLVAVETA_DecodeJPEG(DecInfo* o, void* buffer, int3
     const ThumbnailInfo& t = header.thumbnail;
     const bool located = t.present != 0 && t.offset != 0 &&
                          uint64_t(t.offset) + t.length < window.size;
+    // A sample size divides the main picture, whose size the header has just
+    // given: the object's image size may be missing (no summary) or hold the
+    // target of an earlier thumbnail decode.
+    const uint32_t s = o->sample_size;
+    const int32_t sampled_w = s != 0 ? static_cast<int32_t>(uint32_t(header.width) / s) : 0;
+    const int32_t sampled_h = s != 0 ? static_cast<int32_t>(uint32_t(header.height) / s) : 0;
     if (policy == KOLVAVETA_OPT_THUMB_ALWAYS) {
       if (located && (t.format == kThumbJpeg || t.format == kThumbJpegResource)) {
         use_thumb = true;
         target_w = t.width;
         target_h = t.height;
-        if (o->sample_size != 0) {
-          target_w = o->image_width / static_cast<int32_t>(o->sample_size);
-          target_h = o->image_height / static_cast<int32_t>(o->sample_size);
+        if (s != 0) {
+          target_w = sampled_w;
+          target_h = sampled_h;
           o->sample_size = 1;
         }
       }
@@ -312,21 +320,17 @@ extern "C" VETAJ_API int32_t KOLVAVETA_DecodeJPEG(DecInfo* o, void* buffer, int3
         if (move_window(&window, t.offset) &&
             VETAJ_ParseFileHeader(&window, 8, &thumb) == vj::kStatusOk && thumb.width > 0 &&
             thumb.height > 0) {
-          if (o->sample_size == 0) {
+          if (s == 0) {
             if (thumb.width >= width && thumb.height >= height) {
               use_thumb = true;
               target_w = thumb.width;
               target_h = thumb.height;
             }
-          } else {
-            const int32_t sw = o->image_width / static_cast<int32_t>(o->sample_size);
-            const int32_t sh = o->image_height / static_cast<int32_t>(o->sample_size);
-            if (thumb.width >= sw && thumb.height >= sh) {
-              use_thumb = true;
-              target_w = sw;
-              target_h = sh;
-              o->sample_size = 1;
-            }
+          } else if (thumb.width >= sampled_w && thumb.height >= sampled_h) {
+            use_thumb = true;
+            target_w = sampled_w;
+            target_h = sampled_h;
+            o->sample_size = 1;
           }
         }
       } else if (located && t.format == kThumbJpegResource) {
@@ -362,7 +366,9 @@ extern "C" VETAJ_API int32_t KOLVAVETA_DecodeJPEG(DecInfo* o, void* buffer, int3
     const int32_t ok = VETAJ_DecodeFrame(o, &window, buffer, width, height);
     o->decode_mode = 0;
     if (ok != 0) return ok;
-    // The thumbnail failed: decode the main picture instead.
+    // The thumbnail failed: decode the main picture instead. The error word
+    // describes the outcome of this call, not of the abandoned attempt.
+    vj::set_error(KOLVAVETA_ERR_NONE);
     head_w = header.width;
     head_h = header.height;
   }

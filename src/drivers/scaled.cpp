@@ -335,7 +335,7 @@ int32_t VETAJ_ProcessData_resize(DecoderInfo* d, uint8_t* output, uint32_t* row_
   if (ctl.buffer_full == 0) {
     if (ctl.finished != 0) return vj::kStatusEnd;
     if (d->check_callback != nullptr &&
-        d->check_callback(d->owner, static_cast<int32_t>(rows_consumed(d))) == 0)
+        d->check_callback(d->owner, static_cast<int32_t>(d->output_rows)) == 0)
       return vj::kStatusFail;
     status = fill_buffer(d);
     if (status == vj::kStatusFail) return status;

@@ -1,0 +1,58 @@
+// Whole-image decodes through the public interface, with a guard area behind
+// the output buffer, and the full-size pictures that resized and rotated
+// decodes are compared with.
+#ifndef VETAJ_TESTS_SUPPORT_DECODING_H
+#define VETAJ_TESTS_SUPPORT_DECODING_H
+
+#include <cstdint>
+#include <vector>
+
+#include "VetaJpegDecoder.h"
+#include "support/pictures.h"
+
+namespace vjtest {
+
+using Bytes = std::vector<uint8_t>;
+
+struct DecodeRequest {
+  int format = KOLVAVETA_FMT_RGBA8888;
+  int width = 0, height = 0;  // the buffer, in pixels
+  uint32_t options = KOLVAVETA_OPT_THUMB_NEVER;
+  int mode = KOLVAVETA_MODE_BEST;
+  uint32_t sample_size = 0;
+};
+
+// The result of KOLVAVETA_DecodeJPEG and the object's fields afterwards.
+struct Decoded {
+  int ok = 0;
+  int error = 0;
+  int output_width = 0, output_height = 0;
+  int image_width = 0, image_height = 0;
+  uint32_t options = 0;
+  int decode_mode = 0;
+  uint32_t sample_size = 0;
+  std::vector<uint8_t> buffer;  // buffer_bytes(format, width, height), filled with kFill first
+  bool guard_intact = true;     // nothing was written behind the buffer
+};
+
+// Decodes on an existing object after setting its format, options, mode and
+// sample size.
+Decoded decode_on(DecInfo* object, const DecodeRequest& request);
+// Decodes a memory image on a fresh object.
+Decoded decode_bytes(const Bytes& jpeg, const DecodeRequest& request);
+// A fixture decoded at its own size into a buffer of that size.
+Decoded decode_full(const Bytes& jpeg, int width, int height, int format = KOLVAVETA_FMT_RGBA8888);
+
+// The whole picture of a stream at full size: YCbCr frames as libjpeg's
+// samples (box upsampling), other colour spaces as the library's own
+// full-size RGBA decode (compared with libjpeg by the decode tests; without
+// libjpeg YCbCr frames come from it too).
+struct FullPicture {
+  int width = 0, height = 0;
+  ColourAt at;
+};
+bool full_picture(const Bytes& jpeg, FullPicture* out);
+
+}  // namespace vjtest
+
+#endif  // VETAJ_TESTS_SUPPORT_DECODING_H
