@@ -72,6 +72,17 @@ expect_png("${WORK}/stretched.png" 700 700)
 run_tool(decode "${DATA}/sample.jpg" -o "${WORK}/rows.png" --size 1000x700 --fit rowlen --rotate 270 --format yuv420)
 expect_status(0)
 expect_png("${WORK}/rows.png" 525 700)
+# Reduced decodes: a scale denominator, and the fastest mode into a small
+# stretched buffer.
+run_tool(decode "${DATA}/sample.jpg" -o "${WORK}/quarter.png" --scale 1/4 --format yuv420)
+expect_status(0)
+expect_png("${WORK}/quarter.png" 200 150)
+run_tool(decode "${DATA}/sample.jpg" -o "${WORK}/tiny.png" --size 100x100 --fit stretch --mode 4)
+expect_status(0)
+expect_png("${WORK}/tiny.png" 100 100)
+run_tool(decode "${DATA}/prog_420_q90_640x480.jpg" -o "${WORK}/prog.png" --scale 1/8)
+expect_status(0)
+expect_png("${WORK}/prog.png" 80 60)
 
 # Header summary and Exif fields.
 run_tool(info "${DATA}/exif_orient6_ii_48x32.jpg")
