@@ -65,6 +65,8 @@ struct CarefulFetch;
 template <class Fetch>
 struct BitReader {
   using Word = typename Fetch::Word;
+  // Whether every byte a block can need is in the window.
+  static constexpr bool kFast = Fetch::kFast;
   Word buf;
   int32_t bits;
   const uint8_t* cur;
@@ -172,6 +174,7 @@ struct BitReader {
 // handed back when the state is stored. On 32-bit hosts two bytes per refill.
 struct FastFetch {
   using Word = uintptr_t;
+  static constexpr bool kFast = true;
   static constexpr bool kWide = sizeof(Word) == 8;
   // Whether the refill before a symbol guarantees its magnitude bits too.
   static constexpr bool kHoldsSymbol = kWide;
@@ -251,6 +254,7 @@ struct FastFetch {
 // The exact refill rule, with input refills and marker recording.
 struct CarefulFetch {
   using Word = uint32_t;
+  static constexpr bool kFast = false;
   static constexpr bool kHoldsSymbol = false;
   template <class R>
   static void normalize(R&) {}

@@ -25,7 +25,9 @@ namespace {
 
 // Fills `t` from `src`. Returns false for an invalid table.
 bool build_derived(DerivedHuffTable* t, const HuffTable* src) {
+  AcFastTables* fast = t->fast;  // kept across a rebuild in place
   KOLVAVETA_OsMemset(t, 0, sizeof(*t));
+  t->fast = fast;
   t->source = src;
   uint8_t sizes[257];
   uint32_t codes[257];
@@ -72,46 +74,57 @@ bool build_derived(DerivedHuffTable* t, const HuffTable* src) {
   return true;
 }
 
-void build_skip_table(AcSkipTable* skip, const DerivedHuffTable* t) {
-  for (uint32_t v = 0; v < 256; ++v) {
-    const uint32_t e = t->lookahead[v];
-    const uint32_t len = (e >> 8) % 9;  // a long code gives 0
-    if (len == 0) {
-      skip->entry[v] = 0;
-      continue;
+// Skip entries over a window of kBits bits: every symbol whose code lies
+// wholly inside the window, with its magnitude bits (which may run past
+// it), until an end of block or more than 63 positions.
+template <int kBits>
+void build_skip_entries(uint32_t* out, const DerivedHuffTable* t) {
+  constexpr uint32_t kMask = (1u << kBits) - 1;
+  for (uint32_t v = 0; v <= kMask; ++v) {
+    uint32_t bits = 0;
+    uint32_t advance = 0;
+    for (;;) {
+      if (bits >= kBits) break;
+      // The code at `bits` into the window, looked up by its first 8 bits.
+      const uint32_t rest = (v << bits) & kMask;
+      const uint32_t e = t->lookahead[rest >> (kBits - 8)];
+      const uint32_t len = (e >> 8) % 9;  // a long code gives 0
+      if (len == 0 || bits + len > kBits) break;
+      bits += len;
+      const uint32_t r = (e >> 4) & 15;
+      const uint32_t s = e & 15;
+      if (s != 0) {
+        advance += r + 1;
+        bits += s;
+      } else {
+        advance += r < 15 ? kSkipEob : 16;
+      }
+      if (advance > 63) break;
     }
+    out[v] = advance == 0 ? 0 : (bits | (advance << 16));
+  }
+}
+
+void build_skip_table(AcSkipTable* skip, const DerivedHuffTable* t) {
+  build_skip_entries<8>(skip->entry, t);
+}
+
+// Whole-coefficient entries: a code of at most 8 bits followed by its
+// magnitude bits, within the window.
+void build_fast_coefficients(int32_t* out, const DerivedHuffTable* t) {
+  constexpr uint32_t kMask = (1u << kFastCoefBits) - 1;
+  for (uint32_t v = 0; v <= kMask; ++v) {
+    out[v] = 0;
+    const uint32_t e = t->lookahead[v >> (kFastCoefBits - 8)];
+    const uint32_t len = e >> 8;
     const uint32_t r = (e >> 4) & 15;
     const uint32_t s = e & 15;
-    uint32_t bits = len;
-    uint32_t advance;
-    bool stop;
-    if (s != 0) {
-      bits += s;
-      advance = r + 1;
-      stop = bits > 7;
-    } else if (r < 15) {
-      advance = kSkipEob;
-      stop = true;
-    } else {
-      advance = 16;
-      stop = bits > 7;
-    }
-    while (!stop && bits < 8) {
-      const uint32_t e2 = t->lookahead[(v << bits) & 255];
-      const uint32_t len2 = (e2 >> 8) % 9;
-      if (len2 == 0 || bits + len2 > 8) break;
-      bits += len2;
-      const uint32_t r2 = (e2 >> 4) & 15;
-      const uint32_t s2 = e2 & 15;
-      if (s2 != 0) {
-        advance += r2 + 1;
-        bits += s2;
-      } else {
-        advance += r2 < 15 ? kSkipEob : 16;
-      }
-      stop = advance > 63;
-    }
-    skip->entry[v] = bits | (advance << 16);
+    if (len > 8 || s == 0 || len + s > kFastCoefBits) continue;
+    const uint32_t mag = (v >> (kFastCoefBits - len - s)) & ((1u << s) - 1);
+    int32_t value = static_cast<int32_t>(mag);
+    if (value < VETAJ_HUFF_EXTEND_TEST[s]) value += static_cast<int32_t>(1u - (1u << s));
+    out[v] = static_cast<int32_t>(static_cast<uint32_t>(value) << 16) | static_cast<int32_t>(r << 8) |
+             static_cast<int32_t>(len + s);
   }
 }
 
@@ -137,6 +150,12 @@ int32_t prepare(DecoderInfo* d, int32_t is_dc, int32_t table_no, DerivedHuffTabl
     *slot = t;
   }
   if (!build_derived(t, src)) return vj::kStatusFail;
+  if (!is_dc && !progressive) {
+    if (t->fast == nullptr) t->fast = vj::alloc_zeroed<AcFastTables>();
+    if (t->fast == nullptr) return vj::kStatusFail;
+    build_fast_coefficients(t->fast->coef, t);
+    build_skip_entries<kWideSkipBits>(t->fast->skip, t);
+  }
   if (is_dc) {
     uint32_t n = 0;
     for (int l = 1; l <= 16; ++l) n += src->bits[l];

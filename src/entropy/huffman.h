@@ -15,12 +15,27 @@ constexpr int kLookaheadBits = 8;
 // Lookahead entry of a code longer than 8 bits: length 9, symbol 0.
 constexpr uint32_t kLongCode = 0x900;
 
+struct AcFastTables;
+
 // Decoding table built from a HuffTable.
 struct DerivedHuffTable {
   int32_t maxcode[18];     // [l]: largest code of length l, -1 if none; [17] sentinel
   int32_t valoffset[17];   // [l]: index of the first symbol of length l minus its code
   const HuffTable* source; // symbol values are read through it
   uint32_t lookahead[256]; // next 8 bits -> (length << 8) | symbol, or kLongCode
+  AcFastTables* fast;      // wider tables of baseline AC tables (owned), or null
+};
+
+// Wider lookups of a baseline AC table, used where the window is known to
+// hold the bits:
+// - coef: next 10 bits -> one whole coefficient when its code and magnitude
+//   fit: (value << 16) | (run << 8) | bits taken; 0 otherwise;
+// - skip: next 12 bits -> as AcSkipTable, over a 12-bit window.
+constexpr int kFastCoefBits = 10;
+constexpr int kWideSkipBits = 12;
+struct AcFastTables {
+  int32_t coef[1 << kFastCoefBits];
+  uint32_t skip[1 << kWideSkipBits];
 };
 
 // AC skip table: next 8 bits -> bits | (advance << 16). bits counts every

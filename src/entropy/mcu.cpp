@@ -79,7 +79,33 @@ inline bool decode_block(R& r, const DerivedHuffTable* dct, const DerivedHuffTab
     if (skip != nullptr) return skip_ac(r, act, skip, 1);
   }
   int32_t last = 0;
+  // Where the window holds the bits, whole coefficients come from one
+  // lookup of the next 10 bits when their code and magnitude fit.
+  const int32_t* fast = nullptr;
+  if constexpr (R::kFast) {
+    if (act->fast != nullptr) fast = act->fast->coef;
+  }
   for (int32_t k = 1; k < 64; ++k) {
+    if constexpr (R::kFast) {
+      if (fast != nullptr) {
+        r.prefetch8();
+        const int32_t fe = fast[r.peek(kFastCoefBits)];
+        if (fe != 0) {
+          r.bits -= fe & 0xFF;
+          k += (fe >> 8) & 15;
+          if (kLastStored == 63 || k <= kLastStored) {
+            blk[VETAJ_NATURAL_ORDER[k]] = static_cast<int16_t>(fe >> 16);
+            last = k;
+            continue;
+          }
+          if (skip != nullptr) {
+            *last_out = last;
+            return skip_ac(r, act, skip, k + 1);
+          }
+          continue;
+        }
+      }
+    }
     const int32_t rs = r.decode(act);
     if (rs < 0) return false;
     const int32_t run = rs >> 4;
@@ -111,10 +137,17 @@ inline bool decode_block(R& r, const DerivedHuffTable* dct, const DerivedHuffTab
 // per lookup; ends exactly where a full decode of the block would.
 template <class R>
 inline bool skip_ac(R& r, const DerivedHuffTable* act, const AcSkipTable* skip, int32_t k) {
+  // Where the window holds the bits, the 12-bit table of the same entries
+  // covers more symbols per lookup.
+  const uint32_t* wide = nullptr;
+  if constexpr (R::kFast) {
+    if (act->fast != nullptr) wide = act->fast->skip;
+  }
   while (k < 64) {
     r.prefetch8();
     if (r.bits >= 8) {
-      const uint32_t entry = skip->entry[r.peek(8)];
+      const uint32_t entry =
+          wide != nullptr ? wide[r.peek(kWideSkipBits)] : skip->entry[r.peek(8)];
       const int32_t advance = static_cast<int32_t>(entry >> 16);
       const int32_t nbits = static_cast<int32_t>(entry & 0xFFFF);
       // The common case: complete symbols, and the block goes on.

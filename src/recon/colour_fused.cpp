@@ -19,14 +19,22 @@ void fused_span(const Sink* sinks, const uint8_t* const* luma, const uint8_t* __
     const uint8_t* __restrict rl = range_limit;
     uint32_t i = 0;
     uint32_t x = first;
-    auto pixel = [rl](const Sink& s0, const Sink& s1, uint32_t k, int32_t a, int32_t b,
-                      const ChromaDiff& c) {
-      s0.put_rgb(k, rl[a + c.rd], rl[a + c.gd], rl[a + c.bd]);
-      if constexpr (kCount == 2) s1.put_rgb(k, rl[b + c.rd], rl[b + c.gd], rl[b + c.bd]);
+    // The clamp table offset by each colour difference once per chroma
+    // sample: a pixel is then three lookups indexed by its luma.
+    struct Lanes {
+      const uint8_t* r;
+      const uint8_t* g;
+      const uint8_t* b;
+    };
+    auto lanes = [rl](const ChromaDiff& c) { return Lanes{rl + c.rd, rl + c.gd, rl + c.bd}; };
+    auto pixel = [](const Sink& s0, const Sink& s1, uint32_t k, uint32_t a, uint32_t b,
+                    const Lanes& l) {
+      s0.put_rgb(k, l.r[a], l.g[a], l.b[a]);
+      if constexpr (kCount == 2) s1.put_rgb(k, l.r[b], l.g[b], l.b[b]);
     };
     if (kH == 2 && (x & 1) != 0 && n > 0) {
-      const ChromaDiff c = chroma_diff(cb[x / 2], cr[x / 2]);
-      pixel(sinks[0], sinks[kCount - 1], 0, luma[0][x], luma[kCount - 1][x], c);
+      const Lanes l = lanes(chroma_diff(cb[x / 2], cr[x / 2]));
+      pixel(sinks[0], sinks[kCount - 1], 0, luma[0][x], luma[kCount - 1][x], l);
       i = 1;
       ++x;
     }
@@ -40,14 +48,14 @@ void fused_span(const Sink* sinks, const uint8_t* const* luma, const uint8_t* __
     const uint32_t span = n - i;
     const uint32_t groups = span / kH;
     for (uint32_t m = 0; m < groups; ++m) {
-      const ChromaDiff c = chroma_diff(pb[m], pr[m]);
+      const Lanes l = lanes(chroma_diff(pb[m], pr[m]));
       const uint32_t k = m * kH;
-      pixel(s0, s1, k, y0[k], kCount == 2 ? y1[k] : 0, c);
-      if constexpr (kH == 2) pixel(s0, s1, k + 1, y0[k + 1], kCount == 2 ? y1[k + 1] : 0, c);
+      pixel(s0, s1, k, y0[k], kCount == 2 ? y1[k] : 0, l);
+      if constexpr (kH == 2) pixel(s0, s1, k + 1, y0[k + 1], kCount == 2 ? y1[k + 1] : 0, l);
     }
     if (groups * kH < span) {
       const uint32_t k = groups * kH;
-      pixel(s0, s1, k, y0[k], kCount == 2 ? y1[k] : 0, chroma_diff(pb[groups], pr[groups]));
+      pixel(s0, s1, k, y0[k], kCount == 2 ? y1[k] : 0, lanes(chroma_diff(pb[groups], pr[groups])));
     }
   } else {
     // Planar: luma copied, chroma as stored; the sink picks the pixels
