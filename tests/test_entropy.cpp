@@ -38,7 +38,7 @@ struct TableFixture {
     m.frame_kind = kFrameBaseline;
   }
   ~TableFixture() {
-    for (uint32_t i = 0; i < d.derived_count; ++i) KOLVAVETA_OsFree(d.derived_tables[i]);
+    for (uint32_t i = 0; i < d.derived_count; ++i) vj_free_derived_table(d.derived_tables[i]);
     KOLVAVETA_OsFree(d.derived_tables);
     for (auto* s : e.ac_skip) KOLVAVETA_OsFree(s);
   }
@@ -148,7 +148,7 @@ struct ScanSetupFixture {
     }
   }
   ~ScanSetupFixture() {
-    for (uint32_t i = 0; i < d.derived_count; ++i) KOLVAVETA_OsFree(d.derived_tables[i]);
+    for (uint32_t i = 0; i < d.derived_count; ++i) vj_free_derived_table(d.derived_tables[i]);
     KOLVAVETA_OsFree(d.derived_tables);
     KOLVAVETA_OsFree(d.entropy);
     for (auto* t : d.quant_tables)

@@ -21,10 +21,7 @@ bool vj_register_derived_table(DecoderInfo* d, DerivedHuffTable* table) {
 
 void VETAJ_DeleteDecoderInfo(DecoderInfo* d) {
   if (d == nullptr) return;
-  for (uint32_t i = 0; i < d->derived_count; ++i) {
-    if (d->derived_tables[i] != nullptr) vj::os_free(d->derived_tables[i]->fast);
-    vj::os_free(d->derived_tables[i]);
-  }
+  for (uint32_t i = 0; i < d->derived_count; ++i) vj_free_derived_table(d->derived_tables[i]);
   vj::os_free(d->derived_tables);
   d->derived_count = d->derived_capacity = 0;
   if (d->entropy != nullptr) {

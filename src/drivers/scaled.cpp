@@ -17,8 +17,6 @@ uint32_t rows_consumed(const DecoderInfo* d) {
   return d->reduced_height - d->upsampler->rows_to_go;
 }
 
-// Transform slot of the installed table.
-VETAJ_IdctFn installed_slot(DecoderInfo* d, int32_t index) { return d->idct_slots[index]; }
 int32_t full_index(int32_t last) { return last > 28 ? 28 : (last < 0 ? 0 : last); }
 
 // Top image row of the current MCU row and the block rows per MCU row.
@@ -109,9 +107,36 @@ const uint8_t* centre_for(const DecoderInfo* d, const ComponentInfo* c) {
 
 }  // namespace
 
-int32_t VETAJ_DecodeSingleiMcuResizeNto1(DecoderInfo* d, uint8_t*** rows, McuDecodeFn decode,
-                                         IdctIndexFn index,
-                                         IdctMethodFn method, uint32_t block_step) {
+namespace {
+
+// Transform policies of the row driver. Each gives the routine for a block
+// whose last coefficient is at zig-zag index `last`.
+struct InstalledSlots {  // the decoder's table, indexed by min(last, 28)
+  const DecoderInfo* d;
+  VETAJ_IdctFn operator()(int32_t last) const { return d->idct_slots[full_index(last)]; }
+};
+struct ReducedSlots {  // the reduced table, indexed by min(last, 6)
+  const DecoderInfo* d;
+  VETAJ_IdctFn operator()(int32_t last) const {
+    return d->idct_slots[VETAJ_GetDctMethodIndex(last)];
+  }
+};
+template <VETAJ_IdctFn kRoutine>  // one routine for every block
+struct FixedRoutine {
+  VETAJ_IdctFn operator()(int32_t) const { return kRoutine; }
+};
+struct Selectors {  // index and method functions given by the caller
+  DecoderInfo* d;
+  IdctIndexFn index;
+  IdctMethodFn method;
+  VETAJ_IdctFn operator()(int32_t last) const { return method(d, index(last)); }
+};
+
+// One iMCU row: decode each MCU with `decode`, transform each block into the
+// sample rows (blocks `block_step` samples apart), empty the blocks.
+template <class Transform>
+int32_t decode_rows(DecoderInfo* d, uint8_t*** rows, McuDecodeFn decode, Transform transform,
+                    uint32_t block_step) {
   if (past_region(d)) return vj::kStatusEnd;
   const McuRowGeometry g = row_geometry(d);
   const bool skipping = above_region(d, g.mcu_px);
@@ -135,9 +160,9 @@ int32_t VETAJ_DecodeSingleiMcuResizeNto1(DecoderInfo* d, uint8_t*** rows, McuDec
         const int32_t last = d->last_nonzero[b];
         if (d->imcu_row * c->v_samp + block_row_in_imcu < c->height_blocks) {
           const uint32_t mw = g.single ? 1 : c->mcu_width;
-          method(d, index(last))(centre_for(d, c), c->multipliers, blk,
-                                 rows[c->index] + block_row_in_imcu * block_step,
-                                 (col * mw + p.bx) * block_step);
+          transform(last)(centre_for(d, c), c->multipliers, blk,
+                          rows[c->index] + block_row_in_imcu * block_step,
+                          (col * mw + p.bx) * block_step);
         }
         clear_block(blk, last);
       });
@@ -147,30 +172,37 @@ int32_t VETAJ_DecodeSingleiMcuResizeNto1(DecoderInfo* d, uint8_t*** rows, McuDec
   return next_imcu_row(d);
 }
 
+}  // namespace
+
+int32_t VETAJ_DecodeSingleiMcuResizeNto1(DecoderInfo* d, uint8_t*** rows, McuDecodeFn decode,
+                                         IdctIndexFn index, IdctMethodFn method,
+                                         uint32_t block_step) {
+  return decode_rows(d, rows, decode, Selectors{d, index, method}, block_step);
+}
+
 int32_t VETAJ_DecodeSingleiMcu(DecoderInfo* d, uint8_t*** rows) {
-  return VETAJ_DecodeSingleiMcuResizeNto1(d, rows, d->decode_mcu, full_index,
-                                          installed_slot, 8);
+  return decode_rows(d, rows, d->decode_mcu, InstalledSlots{d}, 8);
 }
 
 int32_t VETAJ_DecodeSingleiMcuResize2to1(DecoderInfo* d, uint8_t*** rows) {
-  return VETAJ_DecodeSingleiMcuResizeNto1(d, rows, VETAJ_DecodeMcu_2to1,
-                                          VETAJ_GetDctMethodIndex, installed_slot, 4);
+  return decode_rows(d, rows, VETAJ_DecodeMcu_2to1, ReducedSlots{d}, 4);
 }
 
 int32_t VETAJ_DecodeSingleiMcuResize4to1(DecoderInfo* d, uint8_t*** rows) {
-  return VETAJ_DecodeSingleiMcuResizeNto1(d, rows, VETAJ_DecodeMcu_4to1,
-                                          VETAJ_GetDctMethodIndex, installed_slot, 2);
+  return decode_rows(d, rows, VETAJ_DecodeMcu_4to1, ReducedSlots{d}, 2);
 }
 
 int32_t VETAJ_DecodeSingleiMcuResize8to1(DecoderInfo* d, uint8_t*** rows) {
-  return VETAJ_DecodeSingleiMcuResizeNto1(d, rows, VETAJ_DecodeMcu_8to1,
-                                          VETAJ_GetDctMethodIndex, installed_slot, 1);
+  return decode_rows(d, rows, VETAJ_DecodeMcu_8to1, FixedRoutine<VETAJ_DoIdct_1x1>{}, 1);
 }
 
 int32_t VETAJ_DecompressOnepass(DecoderInfo* d, uint8_t*** rows) {
-  const uint32_t step = 8u >> d->scale_shift;
-  return VETAJ_DecodeSingleiMcuResizeNto1(d, rows, d->decode_mcu_reduced,
-                                          VETAJ_GetDctMethodIndex, installed_slot, step);
+  switch (d->scale_shift) {
+    case 1: return decode_rows(d, rows, d->decode_mcu_reduced, ReducedSlots{d}, 4);
+    case 2: return decode_rows(d, rows, d->decode_mcu_reduced, ReducedSlots{d}, 2);
+    default:
+      return decode_rows(d, rows, d->decode_mcu_reduced, FixedRoutine<VETAJ_DoIdct_1x1>{}, 1);
+  }
 }
 
 namespace {

@@ -62,8 +62,9 @@ struct FastFetch;
 struct CarefulFetch;
 
 // The working registers of one MCU. Fetch is FastFetch or CarefulFetch.
-template <class Fetch>
+template <class FetchPolicy>
 struct BitReader {
+  using Fetch = FetchPolicy;
   using Word = typename Fetch::Word;
   // Whether every byte a block can need is in the window.
   static constexpr bool kFast = Fetch::kFast;
@@ -201,29 +202,37 @@ struct FastFetch {
   // common case), otherwise byte by byte.
   template <class R>
   static void fill(R& r) {
-    constexpr int kBytes = kWide ? 4 : 2;
-    if constexpr (kWide) {
-      uint32_t w;
-      std::memcpy(&w, r.cur, 4);
-      const uint32_t inv = ~w;  // a 0xFF byte becomes a zero byte
-      if (((inv - 0x01010101u) & ~inv & 0x80808080u) == 0) {
-        r.buf = (r.buf << 32) | load_be32(w);
-        r.cur += 4;
-        r.avail -= 4;
-        r.bits += 32;
+    if constexpr (kWide && std::endian::native == std::endian::little) {
+      // As many whole bytes as the 64-bit word takes (at most seven).
+      int32_t n = (63 - r.bits) >> 3;
+      if (n > 7) n = 7;
+      uint64_t w;
+      std::memcpy(&w, r.cur, 8);
+      const uint64_t inv = ~w;  // a 0xFF byte becomes a zero byte
+      const uint64_t ff = (inv - 0x0101010101010101ull) & ~inv & 0x8080808080808080ull;
+      if ((ff & ((1ull << (8 * n)) - 1)) == 0) {
+        r.buf = (r.buf << (8 * n)) | (__builtin_bswap64(w) >> (64 - 8 * n));
+        r.cur += n;
+        r.avail -= static_cast<uint32_t>(n);
+        r.bits += 8 * n;
         return;
       }
+      for (int32_t i = 0; i < n; ++i) append(r);
+      r.bits += 8 * n;
     } else {
-      if (r.cur[0] != 0xFF && r.cur[1] != 0xFF) {
-        r.buf = (r.buf << 16) | (Word(r.cur[0]) << 8) | r.cur[1];
-        r.cur += 2;
-        r.avail -= 2;
-        r.bits += 16;
-        return;
+      constexpr int kBytes = kWide ? 4 : 2;
+      if constexpr (!kWide) {
+        if (r.cur[0] != 0xFF && r.cur[1] != 0xFF) {
+          r.buf = (r.buf << 16) | (Word(r.cur[0]) << 8) | r.cur[1];
+          r.cur += 2;
+          r.avail -= 2;
+          r.bits += 16;
+          return;
+        }
       }
+      for (int i = 0; i < kBytes; ++i) append(r);
+      r.bits += kBytes * 8;
     }
-    for (int i = 0; i < kBytes; ++i) append(r);
-    r.bits += kBytes * 8;
   }
   template <class R>
   static bool ensure(R& r, int32_t n) {

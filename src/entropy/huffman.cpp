@@ -183,6 +183,11 @@ int32_t prepare(DecoderInfo* d, int32_t is_dc, int32_t table_no, DerivedHuffTabl
 
 }  // namespace
 
+void vj_free_derived_table(DerivedHuffTable*& table) {
+  if (table != nullptr) vj::os_free(table->fast);
+  vj::os_free(table);
+}
+
 int32_t VETAJ_PrepareDerivedTbl(DecoderInfo* d, int32_t is_dc, int32_t table_no,
                                 DerivedHuffTable** slot, EntropyState* entropy) {
   return prepare(d, is_dc, table_no, slot, entropy, false);

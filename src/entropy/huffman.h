@@ -65,6 +65,9 @@ struct EntropyState {
   AcSkipTable* ac_skip_copy[4];
 };
 
+// Frees a derived table with its wider lookups, and clears the pointer.
+void vj_free_derived_table(DerivedHuffTable*& table);
+
 // Builds (or rebuilds in place) the derived table of a baseline scan.
 int32_t VETAJ_PrepareDerivedTbl(DecoderInfo* decoder, int32_t is_dc, int32_t table_no,
                                 DerivedHuffTable** slot, EntropyState* entropy);

@@ -142,6 +142,45 @@ inline bool skip_ac(R& r, const DerivedHuffTable* act, const AcSkipTable* skip, 
   const uint32_t* wide = nullptr;
   if constexpr (R::kFast) {
     if (act->fast != nullptr) wide = act->fast->skip;
+    if constexpr (sizeof(typename R::Word) == 8) {
+      // With 40 bits in hand two lookups are safe (one takes at most 27).
+      const int32_t eob = static_cast<int32_t>(kSkipEob);
+      while (wide != nullptr && k < 64) {
+        if (r.bits < 40) R::Fetch::fill(r);
+        uint32_t entry = wide[r.peek(kWideSkipBits)];
+        if (entry != 0 && k + static_cast<int32_t>(entry >> 16) < 64) {
+          r.bits -= static_cast<int32_t>(entry & 0xFFFF);
+          k += static_cast<int32_t>(entry >> 16);
+          entry = wide[r.peek(kWideSkipBits)];
+          if (entry != 0 && k + static_cast<int32_t>(entry >> 16) < 64) {
+            r.bits -= static_cast<int32_t>(entry & 0xFFFF);
+            k += static_cast<int32_t>(entry >> 16);
+            continue;
+          }
+        }
+        // The block ends inside this lookup, or it holds no complete code.
+        if (entry != 0) {
+          const int32_t advance = static_cast<int32_t>(entry >> 16);
+          if ((advance >= eob && k + advance - eob < 64) || (advance < eob && k + advance == 64)) {
+            r.bits -= static_cast<int32_t>(entry & 0xFFFF);
+            return true;
+          }
+        }
+        const int32_t rs = r.decode(act);
+        if (rs < 0) return false;
+        const int32_t run = rs >> 4;
+        const int32_t s = rs & 15;
+        if (s != 0) {
+          k += run + 1;
+          if (!r.drop(s)) return false;
+        } else if (run == 15) {
+          k += 16;
+        } else {
+          return true;
+        }
+      }
+      return true;
+    }
   }
   while (k < 64) {
     r.prefetch8();
