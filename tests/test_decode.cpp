@@ -52,22 +52,9 @@ void ycc_to_rgb(int y, int cb, int cr, int rgb[3]) {
 }
 
 std::vector<std::string> baseline_ycc_fixtures() {
-  std::vector<std::string> out;
-  for (const auto& n : vjtest::list_fixtures(".jpg")) {
-    vjtest::OracleHeader h;
-    if (!vjtest::oracle_header(vjtest::read_fixture(n), &h)) continue;
-    if (h.progressive || h.num_components != 3 || n.rfind("bad_", 0) == 0) continue;
-    if (h.jpeg_color_space != 3 /* JCS_YCbCr */) continue;
-    out.push_back(n);
-  }
-  return out;
-}
-
-std::string param_name(const ::testing::TestParamInfo<std::string>& param_info) {
-  std::string n = param_info.param;
-  for (char& c : n)
-    if (!isalnum(static_cast<unsigned char>(c))) c = '_';
-  return n;
+  return vjtest::fixtures_where([](const std::string&, const vjtest::OracleHeader& h) {
+    return !h.progressive && h.num_components == 3 && h.jpeg_color_space == 3 /* JCS_YCbCr */;
+  });
 }
 
 class BaselineYcc : public ::testing::TestWithParam<std::string> {};
@@ -104,17 +91,12 @@ TEST_P(BaselineYcc, FullSizeMatchesLibjpeg) {
 }
 
 INSTANTIATE_TEST_SUITE_P(Corpus, BaselineYcc, ::testing::ValuesIn(baseline_ycc_fixtures()),
-                         param_name);
+                         vjtest::fixture_test_name);
 
 std::vector<std::string> other_colour_fixtures() {
-  std::vector<std::string> out;
-  for (const auto& n : vjtest::list_fixtures(".jpg")) {
-    vjtest::OracleHeader h;
-    if (!vjtest::oracle_header(vjtest::read_fixture(n), &h) || h.progressive) continue;
-    if (n.rfind("bad_", 0) == 0 || h.jpeg_color_space == 3) continue;
-    out.push_back(n);
-  }
-  return out;
+  return vjtest::fixtures_where([](const std::string&, const vjtest::OracleHeader& h) {
+    return !h.progressive && h.jpeg_color_space != 3;
+  });
 }
 
 class BaselineOther : public ::testing::TestWithParam<std::string> {};
@@ -162,7 +144,7 @@ TEST_P(BaselineOther, FullSizeMatchesLibjpeg) {
 }
 
 INSTANTIATE_TEST_SUITE_P(Corpus, BaselineOther, ::testing::ValuesIn(other_colour_fixtures()),
-                         param_name);
+                         vjtest::fixture_test_name);
 
 TEST(Decode, SampleLumaMatchesLibjpeg) {
   const auto jpeg = vjtest::read_fixture("sample.jpg");

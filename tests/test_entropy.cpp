@@ -228,13 +228,9 @@ bool is_baseline_fixture(const std::string& n) {
 }
 
 std::vector<std::string> baseline_fixtures() {
-  std::vector<std::string> out;
-  for (const auto& n : vjtest::list_fixtures(".jpg")) {
-    if (!is_baseline_fixture(n)) continue;
-    vjtest::OracleHeader h;
-    if (vjtest::oracle_header(vjtest::read_fixture(n), &h) && !h.progressive) out.push_back(n);
-  }
-  return out;
+  return vjtest::fixtures_where([](const std::string& n, const vjtest::OracleHeader& h) {
+    return is_baseline_fixture(n) && !h.progressive;
+  });
 }
 
 // Decodes every MCU of the first scan and compares each block with the
@@ -284,12 +280,7 @@ TEST_P(BaselineCoefficients, MatchLibjpegInBothFetchPolicies) {
 }
 
 INSTANTIATE_TEST_SUITE_P(Corpus, BaselineCoefficients, ::testing::ValuesIn(baseline_fixtures()),
-                         [](const auto& param_info) {
-                           std::string n = param_info.param;
-                           for (char& c : n)
-                             if (!isalnum(static_cast<unsigned char>(c))) c = '_';
-                           return n;
-                         });
+                         vjtest::fixture_test_name);
 
 // Skipping an MCU keeps the DC predictors exact, and the reduced decoders
 // keep exactly the low coefficients of the full decode.

@@ -88,13 +88,6 @@ std::vector<std::string> jpeg_fixtures(bool bad) {
   return out;
 }
 
-std::string param_name(const ::testing::TestParamInfo<std::string>& info) {
-  std::string s = info.param;
-  for (char& c : s)
-    if (!isalnum(static_cast<unsigned char>(c))) c = '_';
-  return s;
-}
-
 int ceil_div(int a, int b) { return (a + b - 1) / b; }
 
 class GoodFixture : public ::testing::TestWithParam<std::string> {};
@@ -167,7 +160,7 @@ TEST_P(GoodFixture, DecodesWithTheOracle) {
   }
 }
 
-INSTANTIATE_TEST_SUITE_P(Corpus, GoodFixture, ::testing::ValuesIn(jpeg_fixtures(false)), param_name);
+INSTANTIATE_TEST_SUITE_P(Corpus, GoodFixture, ::testing::ValuesIn(jpeg_fixtures(false)), fixture_test_name);
 
 // The library decodes only 8-bit SOF0 and SOF2 frames: each bad file has
 // another frame type, or a precision that libjpeg (8-bit) refuses too.
@@ -187,7 +180,7 @@ TEST_P(BadFixture, HasAFrameTheDecoderMustReject) {
   }
 }
 
-INSTANTIATE_TEST_SUITE_P(Corpus, BadFixture, ::testing::ValuesIn(jpeg_fixtures(true)), param_name);
+INSTANTIATE_TEST_SUITE_P(Corpus, BadFixture, ::testing::ValuesIn(jpeg_fixtures(true)), fixture_test_name);
 
 TEST(FixtureCorpus, TiffContainersHoldADecodableStream) {
   const std::vector<std::string> names = list_fixtures(".tif");

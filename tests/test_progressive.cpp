@@ -38,20 +38,8 @@ Decoded decode(const std::vector<uint8_t>& jpeg, int format, int width, int heig
 #if VETAJ_HAVE_LIBJPEG
 
 std::vector<std::string> progressive_fixtures() {
-  std::vector<std::string> out;
-  for (const auto& n : vjtest::list_fixtures(".jpg")) {
-    vjtest::OracleHeader h;
-    if (n.rfind("bad_", 0) == 0 || !vjtest::oracle_header(vjtest::read_fixture(n), &h)) continue;
-    if (h.progressive) out.push_back(n);
-  }
-  return out;
-}
-
-std::string param_name(const ::testing::TestParamInfo<std::string>& param_info) {
-  std::string n = param_info.param;
-  for (char& c : n)
-    if (!isalnum(static_cast<unsigned char>(c))) c = '_';
-  return n;
+  return vjtest::fixtures_where(
+      [](const std::string&, const vjtest::OracleHeader& h) { return h.progressive != 0; });
 }
 
 class Progressive : public ::testing::TestWithParam<std::string> {};
@@ -73,7 +61,7 @@ TEST_P(Progressive, FullSizeLumaMatchesLibjpeg) {
 }
 
 INSTANTIATE_TEST_SUITE_P(Corpus, Progressive, ::testing::ValuesIn(progressive_fixtures()),
-                         param_name);
+                         vjtest::fixture_test_name);
 
 // Scan headers of a stream: Ss, Se and the frame indexes of the components.
 struct ScanHeader {

@@ -81,22 +81,10 @@ TEST(ScaledHelpers, Arithmetic) {
 #if VETAJ_HAVE_LIBJPEG
 
 std::vector<std::string> scalable_fixtures() {
-  std::vector<std::string> out;
-  for (const auto& n : vjtest::list_fixtures(".jpg")) {
-    vjtest::OracleHeader h;
-    if (n.rfind("bad_", 0) == 0 || !vjtest::oracle_header(vjtest::read_fixture(n), &h)) continue;
-    if (h.progressive || (h.jpeg_color_space != 3 && h.jpeg_color_space != 1)) continue;
-    if (h.width < 16 || h.height < 16) continue;
-    out.push_back(n);
-  }
-  return out;
-}
-
-std::string param_name(const ::testing::TestParamInfo<std::string>& param_info) {
-  std::string n = param_info.param;
-  for (char& c : n)
-    if (!isalnum(static_cast<unsigned char>(c))) c = '_';
-  return n;
+  return vjtest::fixtures_where([](const std::string&, const vjtest::OracleHeader& h) {
+    return !h.progressive && (h.jpeg_color_space == 3 || h.jpeg_color_space == 1) &&
+           h.width >= 16 && h.height >= 16;
+  });
 }
 
 class ScaledLuma : public ::testing::TestWithParam<std::string> {};
@@ -143,7 +131,7 @@ TEST_P(ScaledLuma, MatchesTheReferenceAtEveryReduction) {
 }
 
 INSTANTIATE_TEST_SUITE_P(Corpus, ScaledLuma, ::testing::ValuesIn(scalable_fixtures()),
-                         param_name);
+                         vjtest::fixture_test_name);
 
 // 3/8 (decode modes 2 and 3): the 3x3 transform of the coefficients up to
 // zig-zag index 8, with multipliers that carry the AAN factors, blocks 3

@@ -43,23 +43,9 @@ int32_t VETAJ_ProcessData(DecoderInfo* d, uint8_t* output, uint32_t* row_ctr,
   int32_t status = 0;
   if (ctl.buffer_full == 0) {
     if (ctl.finished != 0) return vj::kStatusEnd;
-    // The callback sees the output rows written so far: the progress
-    // percentage divides them by the output height.
-    if (d->check_callback != nullptr &&
-        d->check_callback(d->owner, static_cast<int32_t>(d->output_rows)) == 0)
-      return vj::kStatusFail;
-    uint8_t** lists[4];
-    for (uint32_t ci = 0; ci < d->num_components; ++ci)
-      lists[ci] = d->sample_lists[ci][ctl.which_set];
-    status = d->imcu.decode_row(d, lists);
-    if (status == vj::kStatusCorrupt || status == vj::kStatusFail) return vj::kStatusFail;
-    // The rows of the last iMCU row are still to be delivered.
-    if (status == vj::kStatusEnd) {
-      ctl.finished = 1;
-      status = 0;
-    }
-    ctl.buffer_full = 1;
-    ++ctl.imcu_rows_done;
+    status = vj_fill_imcu_buffer(d, ctl.which_set, true);
+    if (status == vj::kStatusFail) return status;
+    if (status == vj::kStatusEnd) status = 0;
   }
   switch (ctl.context_state) {
     case kPostponed:

@@ -338,20 +338,6 @@ int32_t VETAJ_DecodeSingleiMcu_resize(DecoderInfo* d, uint8_t*** rows) {
 
 namespace {
 
-// Decodes the next iMCU row into the sample buffer.
-int32_t fill_buffer(DecoderInfo* d) {
-  RowController& ctl = d->controller;
-  uint8_t** lists[4];
-  for (uint32_t ci = 0; ci < d->num_components; ++ci) lists[ci] = d->sample_lists[ci][0];
-  const int32_t status = d->imcu.decode_row(d, lists);
-  if (status == vj::kStatusCorrupt || status == vj::kStatusFail) return vj::kStatusFail;
-  if (status == vj::kStatusEnd) ctl.finished = 1;
-  ctl.buffer_full = 1;
-  ctl.group_counter = 0;
-  ++ctl.imcu_rows_done;
-  return status;
-}
-
 // The buffer is free again once its eight full-size row groups are out.
 void release_buffer(DecoderInfo* d) {
   if (d->controller.group_counter >= 8 || d->upsampler->rows_to_go == 0)
@@ -366,11 +352,9 @@ int32_t VETAJ_ProcessData_resize(DecoderInfo* d, uint8_t* output, uint32_t* row_
   int32_t status = 0;
   if (ctl.buffer_full == 0) {
     if (ctl.finished != 0) return vj::kStatusEnd;
-    if (d->check_callback != nullptr &&
-        d->check_callback(d->owner, static_cast<int32_t>(d->output_rows)) == 0)
-      return vj::kStatusFail;
-    status = fill_buffer(d);
+    status = vj_fill_imcu_buffer(d, 0, true);
     if (status == vj::kStatusFail) return status;
+    ctl.group_counter = 0;
   }
   VETAJ_SetupUpsample(d, output, row_ctr, rows_avail);
   release_buffer(d);
@@ -383,12 +367,31 @@ int32_t VETAJ_ProcessDataSkipRow(DecoderInfo* d, uint8_t* output, uint32_t* row_
   int32_t status = 0;
   if (ctl.buffer_full == 0) {
     if (ctl.finished != 0) return vj::kStatusEnd;
-    status = fill_buffer(d);
+    status = vj_fill_imcu_buffer(d, 0, false);
     if (status == vj::kStatusFail) return status;
+    ctl.group_counter = 0;
   }
   VETAJ_SkipRowUpsample(d, output, row_ctr, rows_avail);
   release_buffer(d);
   return status == vj::kStatusEnd ? 0 : status;
+}
+
+int32_t vj_fill_imcu_buffer(DecoderInfo* d, uint32_t which, bool check) {
+  RowController& ctl = d->controller;
+  // The callback sees the output rows written so far: the progress
+  // percentage divides them by the output height.
+  if (check && d->check_callback != nullptr &&
+      d->check_callback(d->owner, static_cast<int32_t>(d->output_rows)) == 0)
+    return vj::kStatusFail;
+  uint8_t** lists[4];
+  for (uint32_t ci = 0; ci < d->num_components; ++ci) lists[ci] = d->sample_lists[ci][which];
+  const int32_t status = d->imcu.decode_row(d, lists);
+  if (status == vj::kStatusCorrupt || status == vj::kStatusFail) return vj::kStatusFail;
+  // After the last iMCU row its rows are still to be delivered.
+  if (status == vj::kStatusEnd) ctl.finished = 1;
+  ctl.buffer_full = 1;
+  ++ctl.imcu_rows_done;
+  return status;
 }
 
 uint32_t GCD(uint32_t a, uint32_t b) {

@@ -43,6 +43,11 @@ int32_t VETAJ_ProcessData_resize(DecoderInfo* decoder, uint8_t* output, uint32_t
 int32_t VETAJ_ProcessDataSkipRow(DecoderInfo* decoder, uint8_t* output, uint32_t* row_ctr,
                                  uint32_t rows_avail);
 
+// Decodes the next iMCU row into sample list set `which` (after the check
+// callback when `check`): the decode status, or 201 when the callback
+// aborts or the data is corrupt. Marks the controller's buffer full.
+int32_t vj_fill_imcu_buffer(DecoderInfo* decoder, uint32_t which, bool check);
+
 // Helpers.
 uint32_t GCD(uint32_t a, uint32_t b);
 uint32_t LCM(uint32_t a, uint32_t b);

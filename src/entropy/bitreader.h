@@ -22,6 +22,7 @@
 #include <cstring>
 
 #include "drivers/decoder.h"
+#include "entropy/mcu.h"
 
 namespace vj {
 
@@ -325,6 +326,21 @@ struct CarefulFetch {
     if (r.bits < 8) (void)append(r);
   }
 };
+
+// What every MCU decoder does first: the restart marker when one is due,
+// then the insufficient-data rule (an MCU after data cut short decodes to
+// nothing). Returns -1 to decode the MCU, otherwise its result.
+inline int32_t begin_mcu(DecoderInfo* d, bool honour_insufficient) {
+  EntropyState* e = d->entropy;
+  if (e == nullptr || d->window == nullptr) return 0;
+  if (d->restart_interval != 0 && e->restarts_to_go == 0 && VETAJ_ProcessRestartMarker(d) == 0)
+    return 0;
+  if (honour_insufficient && e->insufficient != 0) {
+    --e->restarts_to_go;
+    return 1;
+  }
+  return -1;
+}
 
 }  // namespace vj
 

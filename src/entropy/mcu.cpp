@@ -133,10 +133,55 @@ inline bool decode_block(R& r, const DerivedHuffTable* dct, const DerivedHuffTab
   return true;
 }
 
+// What one skip-table lookup means at block position k.
+enum class SkipStep { kGoOn, kEnds, kByHand };
+
+// The common case takes the lookup's symbols and the block goes on; the
+// block can also end inside the lookup (an end of block, or exactly at
+// position 63); otherwise the lookup runs past the block or holds no
+// complete code, and the next symbol is taken by hand.
+template <class R>
+inline SkipStep take_lookup(R& r, uint32_t entry, int32_t* k) {
+  if (entry == 0) return SkipStep::kByHand;
+  const int32_t advance = static_cast<int32_t>(entry >> 16);
+  const int32_t nbits = static_cast<int32_t>(entry & 0xFFFF);
+  const int32_t eob = static_cast<int32_t>(kSkipEob);
+  if (*k + advance < 64) {
+    r.bits -= nbits;  // may go negative: the next refill restores it
+    *k += advance;
+    return SkipStep::kGoOn;
+  }
+  if ((advance >= eob && *k + advance - eob < 64) || (advance < eob && *k + advance == 64)) {
+    r.bits -= nbits;
+    return SkipStep::kEnds;
+  }
+  return SkipStep::kByHand;
+}
+
+// One AC symbol decoded and stepped over. False at the end of the block
+// (`*ok` tells whether the input held out).
+template <class R>
+inline bool skip_symbol(R& r, const DerivedHuffTable* act, int32_t* k, bool* ok) {
+  const int32_t rs = r.decode(act);
+  *ok = rs >= 0;
+  if (rs < 0) return false;
+  const int32_t run = rs >> 4;
+  const int32_t s = rs & 15;
+  if (s != 0) {
+    *k += run + 1;
+    *ok = r.drop(s);
+    return *ok;
+  }
+  if (run != 15) return false;  // end of block
+  *k += 16;
+  return true;
+}
+
 // Steps over the AC data of one block with the skip table, several symbols
 // per lookup; ends exactly where a full decode of the block would.
 template <class R>
 inline bool skip_ac(R& r, const DerivedHuffTable* act, const AcSkipTable* skip, int32_t k) {
+  bool ok = true;
   // Where the window holds the bits, the 12-bit table of the same entries
   // covers more symbols per lookup.
   const uint32_t* wide = nullptr;
@@ -144,40 +189,12 @@ inline bool skip_ac(R& r, const DerivedHuffTable* act, const AcSkipTable* skip, 
     if (act->fast != nullptr) wide = act->fast->skip;
     if constexpr (sizeof(typename R::Word) == 8) {
       // With 40 bits in hand two lookups are safe (one takes at most 27).
-      const int32_t eob = static_cast<int32_t>(kSkipEob);
       while (wide != nullptr && k < 64) {
         if (r.bits < 40) R::Fetch::fill(r);
-        uint32_t entry = wide[r.peek(kWideSkipBits)];
-        if (entry != 0 && k + static_cast<int32_t>(entry >> 16) < 64) {
-          r.bits -= static_cast<int32_t>(entry & 0xFFFF);
-          k += static_cast<int32_t>(entry >> 16);
-          entry = wide[r.peek(kWideSkipBits)];
-          if (entry != 0 && k + static_cast<int32_t>(entry >> 16) < 64) {
-            r.bits -= static_cast<int32_t>(entry & 0xFFFF);
-            k += static_cast<int32_t>(entry >> 16);
-            continue;
-          }
-        }
-        // The block ends inside this lookup, or it holds no complete code.
-        if (entry != 0) {
-          const int32_t advance = static_cast<int32_t>(entry >> 16);
-          if ((advance >= eob && k + advance - eob < 64) || (advance < eob && k + advance == 64)) {
-            r.bits -= static_cast<int32_t>(entry & 0xFFFF);
-            return true;
-          }
-        }
-        const int32_t rs = r.decode(act);
-        if (rs < 0) return false;
-        const int32_t run = rs >> 4;
-        const int32_t s = rs & 15;
-        if (s != 0) {
-          k += run + 1;
-          if (!r.drop(s)) return false;
-        } else if (run == 15) {
-          k += 16;
-        } else {
-          return true;
-        }
+        SkipStep step = take_lookup(r, wide[r.peek(kWideSkipBits)], &k);
+        if (step == SkipStep::kGoOn) step = take_lookup(r, wide[r.peek(kWideSkipBits)], &k);
+        if (step == SkipStep::kGoOn) continue;
+        if (step == SkipStep::kEnds || !skip_symbol(r, act, &k, &ok)) return ok;
       }
       return true;
     }
@@ -185,40 +202,12 @@ inline bool skip_ac(R& r, const DerivedHuffTable* act, const AcSkipTable* skip, 
   while (k < 64) {
     r.prefetch8();
     if (r.bits >= 8) {
-      const uint32_t entry =
-          wide != nullptr ? wide[r.peek(kWideSkipBits)] : skip->entry[r.peek(8)];
-      const int32_t advance = static_cast<int32_t>(entry >> 16);
-      const int32_t nbits = static_cast<int32_t>(entry & 0xFFFF);
-      // The common case: complete symbols, and the block goes on.
-      if (entry != 0 && k + advance < 64) {
-        r.bits -= nbits;  // may go negative: the next refill restores it
-        k += advance;
-        continue;
-      }
-      // The block ends inside the lookup: at an end of block, or exactly at
-      // position 63.
-      if (entry != 0) {
-        const int32_t eob = static_cast<int32_t>(kSkipEob);
-        if ((advance >= eob && k + advance - eob < 64) || (advance < eob && k + advance == 64)) {
-          r.bits -= nbits;
-          return true;
-        }
-      }
-      // Otherwise the lookup runs past the end of the block (or holds no
-      // complete code): one symbol at a time.
+      const SkipStep step = take_lookup(
+          r, wide != nullptr ? wide[r.peek(kWideSkipBits)] : skip->entry[r.peek(8)], &k);
+      if (step == SkipStep::kGoOn) continue;
+      if (step == SkipStep::kEnds) return true;
     }
-    const int32_t rs = r.decode(act);
-    if (rs < 0) return false;
-    const int32_t run = rs >> 4;
-    const int32_t s = rs & 15;
-    if (s != 0) {
-      k += run + 1;
-      if (!r.drop(s)) return false;
-    } else if (run == 15) {
-      k += 16;
-    } else {
-      return true;
-    }
+    if (!skip_symbol(r, act, &k, &ok)) return ok;
   }
   return true;
 }
@@ -336,14 +325,9 @@ int32_t VETAJ_DecodeMcu_8to1(DecoderInfo* d, int16_t** blocks) {
 int32_t VETAJ_SkipMcu(DecoderInfo* d) { return decode_mcu<0, Keep::kNone, false>(d, nullptr); }
 
 int32_t VETAJ_FastDecodeMcu(DecoderInfo* d, int16_t** blocks) {
+  const int32_t early = vj::begin_mcu(d, true);
+  if (early >= 0) return early;
   EntropyState* e = d->entropy;
-  if (e == nullptr || d->window == nullptr) return 0;
-  if (d->restart_interval != 0 && e->restarts_to_go == 0 && VETAJ_ProcessRestartMarker(d) == 0)
-    return 0;
-  if (e->insufficient != 0) {
-    --e->restarts_to_go;
-    return 1;
-  }
   const uint32_t nb = d->blocks_in_mcu;
   // A pending end-of-band run passes over whole blocks first.
   uint32_t first = 0;

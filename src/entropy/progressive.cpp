@@ -163,14 +163,10 @@ bool ac_refine(Reader& r, DecoderInfo* d, int16_t** blocks) {
 
 template <Pass kPass>
 int32_t decode_prog_mcu(DecoderInfo* d, int16_t** blocks) {
+  // A DC refinement reads its bits whatever the insufficient-data flag says.
+  const int32_t early = vj::begin_mcu(d, kPass != Pass::kDcRefine);
+  if (early >= 0) return early;
   EntropyState* e = d->entropy;
-  if (e == nullptr || d->window == nullptr) return 0;
-  if (d->restart_interval != 0 && e->restarts_to_go == 0 && VETAJ_ProcessRestartMarker(d) == 0)
-    return 0;
-  if (kPass != Pass::kDcRefine && e->insufficient != 0) {
-    --e->restarts_to_go;
-    return 1;
-  }
   Reader r(d);
   r.eof_as_marker = true;
   bool ok;

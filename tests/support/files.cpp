@@ -68,4 +68,11 @@ std::vector<std::string> list_fixtures(const std::string& suffix) {
   return names;
 }
 
+std::string fixture_test_name(const ::testing::TestParamInfo<std::string>& info) {
+  std::string n = info.param;
+  for (char& c : n)
+    if (!isalnum(static_cast<unsigned char>(c))) c = '_';
+  return n;
+}
+
 }  // namespace vjtest

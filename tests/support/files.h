@@ -2,6 +2,8 @@
 #ifndef VETAJ_TESTS_SUPPORT_FILES_H
 #define VETAJ_TESTS_SUPPORT_FILES_H
 
+#include <gtest/gtest.h>
+
 #include <cstdint>
 #include <string>
 #include <vector>
@@ -30,6 +32,9 @@ std::vector<uint8_t> read_fixture(const std::string& name);
 std::vector<uint8_t> read_file(const std::string& path);
 // Names of the fixtures whose names end with `suffix` (sorted).
 std::vector<std::string> list_fixtures(const std::string& suffix = ".jpg");
+
+// Test-name form of a fixture name: letters and digits, the rest '_'.
+std::string fixture_test_name(const ::testing::TestParamInfo<std::string>& info);
 
 }  // namespace vjtest
 

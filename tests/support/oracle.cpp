@@ -1,6 +1,8 @@
 // Reference decoding with libjpeg for the tests (see oracle.h).
 #include "support/oracle.h"
 
+#include "support/files.h"
+
 #if VETAJ_HAVE_LIBJPEG
 
 #include <csetjmp>
@@ -252,6 +254,17 @@ bool oracle_truncated_planes(const std::vector<uint8_t>& jpeg, int keep, int sca
   req.transcoded = &transcoded;
   if (!run(jpeg, req)) return false;
   return oracle_planes(transcoded, scale_denom, out);
+}
+
+std::vector<std::string> fixtures_where(
+    const std::function<bool(const std::string& name, const OracleHeader& header)>& keep) {
+  std::vector<std::string> out;
+  for (const auto& name : list_fixtures(".jpg")) {
+    OracleHeader h;
+    if (name.rfind("bad_", 0) == 0 || !oracle_header(read_fixture(name), &h)) continue;
+    if (keep(name, h)) out.push_back(name);
+  }
+  return out;
 }
 
 bool oracle_sequential_scans(const std::vector<uint8_t>& jpeg, std::vector<uint8_t>* out) {

@@ -11,6 +11,8 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <functional>
+#include <string>
 #include <vector>
 
 namespace vjtest {
@@ -60,6 +62,10 @@ bool oracle_planes_as(const std::vector<uint8_t>& jpeg, int scale_denom, int out
 // first), as oracle_planes does.
 bool oracle_truncated_planes(const std::vector<uint8_t>& jpeg, int keep, int scale_denom,
                              OraclePlanes* out);
+// The JPEG fixtures (not bad_*) whose name and header pass `keep`.
+std::vector<std::string> fixtures_where(
+    const std::function<bool(const std::string& name, const OracleHeader& header)>& keep);
+
 // Rewrites the stream losslessly as a sequential frame with one scan per
 // component.
 bool oracle_sequential_scans(const std::vector<uint8_t>& jpeg, std::vector<uint8_t>* out);
