@@ -7,6 +7,14 @@
 
 namespace {
 
+// A new zeroed object (error 0), or null with error 4.
+DecInfo* new_object() {
+  vj::set_error(KOLVAVETA_ERR_NONE);
+  DecInfo* object = vj::alloc_zeroed<DecInfo>();
+  if (object == nullptr) vj::set_error(KOLVAVETA_ERR_NO_MEMORY);
+  return object;
+}
+
 DecInfo* finish_create(DecInfo* object, IoStream* stream, int32_t output_format,
                        uint32_t options) {
   if (stream == nullptr) {
@@ -30,12 +38,8 @@ extern "C" {
 
 VETAJ_API DecInfo* KOLVAVETA_CreateDecInfo(int32_t kind, void* source, uint32_t size,
                                            int32_t output_format, uint32_t options) {
-  vj::set_error(KOLVAVETA_ERR_NONE);
-  DecInfo* object = vj::alloc_zeroed<DecInfo>();
-  if (object == nullptr) {
-    vj::set_error(KOLVAVETA_ERR_NO_MEMORY);
-    return nullptr;
-  }
+  DecInfo* object = new_object();
+  if (object == nullptr) return nullptr;
   return finish_create(object, KOLVAVETA_Open_IO(kind, source, size), output_format, options);
 }
 
@@ -44,12 +48,8 @@ VETAJ_API DecInfo* KOLVAVETA_CreateDecInfoWithStream(void* source, uint32_t size
                                                      KOLVAVETA_StreamFn skip_callback,
                                                      KOLVAVETA_StreamFn rewind_callback,
                                                      int32_t output_format, uint32_t options) {
-  vj::set_error(KOLVAVETA_ERR_NONE);
-  DecInfo* object = vj::alloc_zeroed<DecInfo>();
-  if (object == nullptr) {
-    vj::set_error(KOLVAVETA_ERR_NO_MEMORY);
-    return nullptr;
-  }
+  DecInfo* object = new_object();
+  if (object == nullptr) return nullptr;
   IoStream* stream =
       KOLVAVETA_Open_Stream(source, read_callback, skip_callback, rewind_callback, size);
   return finish_create(object, stream, output_format, options);

@@ -342,6 +342,21 @@ inline int32_t begin_mcu(DecoderInfo* d, bool honour_insufficient) {
   return -1;
 }
 
+// A pending end-of-band run passes over whole blocks of the MCU first:
+// returns the first block to decode (blocks in MCU when the run covers
+// them all).
+inline uint32_t blocks_passed_by_eob_run(DecoderInfo* d) {
+  const uint32_t nb = d->blocks_in_mcu;
+  if (d->eob_run == 0) return 0;
+  if (d->eob_run < nb) {
+    const uint32_t first = d->eob_run;
+    d->eob_run = 0;
+    return first;
+  }
+  d->eob_run -= nb;
+  return nb;
+}
+
 }  // namespace vj
 
 #endif  // VETAJ_ENTROPY_BITREADER_H

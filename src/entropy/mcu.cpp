@@ -329,17 +329,10 @@ int32_t VETAJ_FastDecodeMcu(DecoderInfo* d, int16_t** blocks) {
   if (early >= 0) return early;
   EntropyState* e = d->entropy;
   const uint32_t nb = d->blocks_in_mcu;
-  // A pending end-of-band run passes over whole blocks first.
-  uint32_t first = 0;
-  if (d->eob_run != 0) {
-    if (d->eob_run < nb) {
-      first = d->eob_run;
-      d->eob_run = 0;
-    } else {
-      d->eob_run -= nb;
-      --e->restarts_to_go;
-      return 1;
-    }
+  const uint32_t first = vj::blocks_passed_by_eob_run(d);
+  if (first == nb) {
+    --e->restarts_to_go;
+    return 1;
   }
   BitReader<CarefulFetch> r(d);
   int32_t pred[4] = {e->last_dc[0], e->last_dc[1], e->last_dc[2], e->last_dc[3]};

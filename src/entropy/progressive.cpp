@@ -39,16 +39,8 @@ bool dc_refine(Reader& r, DecoderInfo* d, int16_t** blocks) {
 bool ac_first(Reader& r, DecoderInfo* d, int16_t** blocks) {
   EntropyState* e = d->entropy;
   const uint32_t nb = d->blocks_in_mcu;
-  uint32_t first = 0;
-  if (d->eob_run != 0) {
-    if (d->eob_run < nb) {
-      first = d->eob_run;
-      d->eob_run = 0;
-    } else {
-      d->eob_run -= nb;
-      return true;
-    }
-  }
+  const uint32_t first = vj::blocks_passed_by_eob_run(d);
+  if (first == nb) return true;
   const int32_t ss = static_cast<int32_t>(d->Ss);
   const int32_t se = static_cast<int32_t>(d->Se);
   const uint32_t al = d->Al;
