@@ -101,12 +101,12 @@ Bytes without_segment(Bytes jpeg, uint8_t code) {
 Bytes without_last_component(Bytes jpeg) {
   for (const uint8_t code : {uint8_t(0xDA), uint8_t(0xC0)}) {
     const size_t at = segment(jpeg, code);
-    const size_t count_at = at + (code == 0xC0 ? 9 : 4), spec = code == 0xC0 ? 3 : 2;
+    const size_t count_at = at + (code == 0xC0 ? 9 : 4), entry_size = code == 0xC0 ? 3 : 2;
     const size_t n = jpeg[count_at];
-    const size_t last = count_at + 1 + (n - 1) * spec;
-    jpeg.erase(jpeg.begin() + std::ptrdiff_t(last), jpeg.begin() + std::ptrdiff_t(last + spec));
+    const size_t last = count_at + 1 + (n - 1) * entry_size;
+    jpeg.erase(jpeg.begin() + std::ptrdiff_t(last), jpeg.begin() + std::ptrdiff_t(last + entry_size));
     jpeg[count_at] = uint8_t(n - 1);
-    const size_t length = ((size_t(jpeg[at + 2]) << 8) | jpeg[at + 3]) - spec;
+    const size_t length = ((size_t(jpeg[at + 2]) << 8) | jpeg[at + 3]) - entry_size;
     jpeg[at + 2] = uint8_t(length >> 8);
     jpeg[at + 3] = uint8_t(length);
   }

@@ -272,10 +272,10 @@ TEST(FillMode, CropsHalfTheOverhangOnEachSide) {
        {Case{400, 300, 200, 267, 200, 50, 0, 300}, Case{300, 400, 200, 200, 267, 0, 50, 300},
         Case{303, 200, 100, 152, 100, 51, 0, 200}}) {
     SCOPED_TRACE(testing::Message() << c.w << "x" << c.h);
-    SyntheticSpec spec;
-    spec.width = c.w;
-    spec.height = c.h;
-    const Bytes jpeg = encode_synthetic(spec);
+    SyntheticPicture picture;
+    picture.width = c.w;
+    picture.height = c.h;
+    const Bytes jpeg = encode_synthetic(picture);
     FullPicture full;
     ASSERT_TRUE(full_picture(jpeg, &full));
     for (const int format : {KOLVAVETA_FMT_RGBA8888, KOLVAVETA_FMT_YUV420}) {

@@ -292,16 +292,16 @@ TEST(ProgressiveDecoding, DamagedScansAreSurvived) {
     // Scan headers rewritten: Ss > Se, Al and Ah raised, components changed.
     for (const auto& sh : scan_headers(jpeg)) {
       const size_t ns = jpeg[sh.sos + 4];
-      const size_t spec = sh.sos + 5 + 2 * ns;
+      const size_t params = sh.sos + 5 + 2 * ns;
       auto a = jpeg;
-      a[spec] = 40;
-      a[spec + 1] = 20;
+      a[params] = 40;
+      a[params + 1] = 20;
       variants.push_back(a);
       auto b = jpeg;
-      b[spec + 2] = 0xDD;
+      b[params + 2] = 0xDD;
       variants.push_back(b);
       auto c = jpeg;
-      c[spec + 2] = 0x0D;
+      c[params + 2] = 0x0D;
       variants.push_back(c);
     }
     for (const auto& v : variants) {

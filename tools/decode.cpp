@@ -121,14 +121,14 @@ bool set_exif_orient(DecodeRequest* r, const char*) { return r->exif_orient = tr
 bool set_raw(DecodeRequest* r, const char*) { return r->raw = true; }
 bool set_progress(DecodeRequest* r, const char*) { return r->progress = true; }
 
-struct OptionSpec {
+struct OptionRule {
   const char* name;
   const char* alias;     // short form, or null
   const char* expected;  // what the value must be; null for a flag
   bool (*apply)(DecodeRequest*, const char* value);
 };
 
-const OptionSpec kOptions[] = {
+const OptionRule kOptions[] = {
     {"--output", "-o", "a file name", parse_output},
     {"--size", nullptr, "WxH with sides from 1 to 50000", parse_size},
     {"--scale", nullptr, "1/N with N a power of two (1, 2, 4, 8, ...)", parse_scale},
@@ -161,18 +161,18 @@ Parsed parse_arguments(int argc, char** argv, DecodeRequest* r) {
     // "--name=value" or "--name value".
     const char* eq = std::strchr(arg, '=');
     const std::string name = eq != nullptr ? std::string(arg, eq) : std::string(arg);
-    const OptionSpec* spec = nullptr;
-    for (const OptionSpec& s : kOptions) {
-      if (name == s.name || (s.alias != nullptr && name == s.alias)) spec = &s;
+    const OptionRule* rule = nullptr;
+    for (const OptionRule& s : kOptions) {
+      if (name == s.name || (s.alias != nullptr && name == s.alias)) rule = &s;
     }
-    if (spec == nullptr) {
+    if (rule == nullptr) {
       usage_error("decode: unknown option '%s'", arg);
       return Parsed::kError;
     }
     const char* value = nullptr;
-    if (spec->expected == nullptr) {
+    if (rule->expected == nullptr) {
       if (eq != nullptr) {
-        usage_error("decode: %s takes no value", spec->name);
+        usage_error("decode: %s takes no value", rule->name);
         return Parsed::kError;
       }
     } else if (eq != nullptr) {
@@ -180,11 +180,11 @@ Parsed parse_arguments(int argc, char** argv, DecodeRequest* r) {
     } else if (i + 1 < argc) {
       value = argv[++i];
     } else {
-      usage_error("decode: %s needs a value (%s)", spec->name, spec->expected);
+      usage_error("decode: %s needs a value (%s)", rule->name, rule->expected);
       return Parsed::kError;
     }
-    if (!spec->apply(r, value)) {
-      usage_error("decode: bad value '%s' for %s: expected %s", value, spec->name, spec->expected);
+    if (!rule->apply(r, value)) {
+      usage_error("decode: bad value '%s' for %s: expected %s", value, rule->name, rule->expected);
       return Parsed::kError;
     }
   }

@@ -17,7 +17,7 @@ struct QuantTable {
   uint32_t ratios[64];
 };
 
-// One Huffman table specification as read from a DHT segment.
+// One Huffman table as read from a DHT segment.
 struct HuffTable {
   uint8_t bits[17];      // entries 1..16: number of codes of each length
   uint8_t huffval[256];  // symbol values in the order of the segment

@@ -12,7 +12,7 @@ namespace {
 
 // Sample c of pixel (x, y): diagonal gradients, a bright disc, a grid of
 // dark bars and a little hashed noise.
-uint8_t sample(const SyntheticSpec& s, int x, int y, int c) {
+uint8_t sample(const SyntheticPicture& s, int x, int y, int c) {
   int v = c == 0   ? x * 255 / s.width
           : c == 1 ? y * 255 / s.height
                    : (x + y) * 127 / (s.width + s.height);
@@ -29,7 +29,7 @@ uint8_t sample(const SyntheticSpec& s, int x, int y, int c) {
 
 }  // namespace
 
-std::vector<uint8_t> encode_synthetic(const SyntheticSpec& s) {
+std::vector<uint8_t> encode_synthetic(const SyntheticPicture& s) {
   jpeg_compress_struct c;
   jpeg_error_mgr err;
   c.err = jpeg_std_error(&err);

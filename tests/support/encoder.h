@@ -10,7 +10,7 @@
 
 namespace vjtest {
 
-struct SyntheticSpec {
+struct SyntheticPicture {
   int width = 64, height = 48;
   int components = 3;          // 1 (grey) or 3 (YCbCr with a JFIF marker)
   int h_samp = 2, v_samp = 2;  // luma sampling factors; chroma is 1x1
@@ -20,8 +20,8 @@ struct SyntheticSpec {
 };
 
 // A baseline stream of a picture with gradients, hard edges and noise (the
-// same picture for the same spec).
-std::vector<uint8_t> encode_synthetic(const SyntheticSpec& spec);
+// same picture for the same description).
+std::vector<uint8_t> encode_synthetic(const SyntheticPicture& picture);
 
 }  // namespace vjtest
 
