@@ -350,6 +350,9 @@ VETAJ_API int32_t VETAJ_GetVersion(void);
 /* Handles and aliases                                                  */
 /* ------------------------------------------------------------------ */
 
+/* Declared for the complete interface; this release does not define them
+ * yet (linking against them fails). */
+
 VETAJ_API int32_t KOLVAVETA_OpenDecHandle(void* source, uint32_t size, int32_t kind);
 VETAJ_API int32_t KOLVAVETA_OpenDecHandle_Stream(void* source, uint32_t size, int32_t kind,
                                                  KOLVAVETA_StreamFn read_callback,
@@ -400,11 +403,15 @@ VETAJ_API extern const int32_t VETAJ_HUFF_EXTEND_TEST[16];
 VETAJ_API extern const VETAJ_IdctFn pIDctFunc[29];
 VETAJ_API extern const VETAJ_IdctFn pIDctFuncIslow[29];
 VETAJ_API extern const VETAJ_IdctFn* const pIDctResizeFunc[4];
+/* Region row decoders by scale (not defined in this release, see below). */
 VETAJ_API extern const VETAJ_RowDecoderFn pRegionDecodingResize[7];
 
 /* ------------------------------------------------------------------ */
 /* Region decoding and the scan index                                   */
 /* ------------------------------------------------------------------ */
+
+/* Declared for the complete interface; this release does not define them
+ * yet (linking against them fails). */
 
 VETAJ_API DecInfo* KOLVAVETA_CreateRegionDecoderInstance(DecInfo* parent, uint32_t x,
                                                          uint32_t y, uint32_t width,
@@ -436,6 +443,9 @@ VETAJ_API int32_t KOLVAVETA_ScanHuffmanInfoWithDec(DecInfo* object, void* output
 /* Parallel strip decoding and thread bodies                            */
 /* ------------------------------------------------------------------ */
 
+/* Declared for the complete interface; this release does not define them
+ * yet (linking against them fails). */
+
 VETAJ_API int32_t KOLVAVETA_PDecodeJPEG(DecInfo* object, void* output_buffer, int32_t width,
                                         int32_t height, uint32_t sample_size);
 VETAJ_API int32_t KOLVAVETA_PDecodeJPEG_RST(DecInfo* object, void* output_buffer,
@@ -452,6 +462,9 @@ VETAJ_API void* dualdecode_jpeg(void* job);
 /* ------------------------------------------------------------------ */
 /* Row-iterative decoding                                               */
 /* ------------------------------------------------------------------ */
+
+/* Declared for the complete interface; this release does not define them
+ * yet (linking against them fails). */
 
 VETAJ_API int32_t KOLVAVETA_PrepareJPEGIter(DecInfo* object, int32_t width, int32_t height);
 VETAJ_API int32_t KOLVAVETA_InitJPEGIter(DecInfo* object, void* output_buffer, int32_t width,
@@ -493,6 +506,9 @@ VETAJ_API int32_t __VETA_ParserWBMP(DecInfo* object, struct StreamWindow* window
 /* ------------------------------------------------------------------ */
 /* Host-toolkit entry points                                            */
 /* ------------------------------------------------------------------ */
+
+/* Declared for the complete interface; this release does not define them
+ * yet (linking against them fails). */
 
 VETAJ_API int32_t KOLVAVETA_SkiaInitializeJPEG(DecInfo* object, uint32_t sample_size);
 VETAJ_API int32_t KOLVAVETA_SkiaDecodeJPEG(DecInfo* object, void* output_buffer,
