@@ -10,18 +10,9 @@
 
 namespace vjtest {
 
-struct SyntheticPicture {
-  int width = 64, height = 48;
-  int components = 3;          // 1 (grey) or 3 (YCbCr with a JFIF marker)
-  int h_samp = 2, v_samp = 2;  // luma sampling factors; chroma is 1x1
-  int quality = 90;
-  int restart_interval = 0;  // in MCUs
-  uint32_t seed = 1;
-};
-
-// A baseline stream of a picture with gradients, hard edges and noise (the
-// same picture for the same description).
-std::vector<uint8_t> encode_synthetic(const SyntheticPicture& picture);
+// A baseline 4:2:0 YCbCr stream (quality 90, restart interval in MCUs) of a
+// picture with gradients, a disc, dark bars and a little noise.
+std::vector<uint8_t> encode_synthetic(int width, int height, int restart_interval = 0);
 
 }  // namespace vjtest
 
