@@ -78,22 +78,14 @@ struct Planes {
 
 int components_of(int space) { return space == kColourGrey ? 1 : space >= kColourCmyk ? 4 : 3; }
 
-// The colour of source pixel (x, y) under a colour space.
+// The colour of source pixel (x + dx, y + dy) under a colour space.
 ColourAt source_colours(int space, const Planes& s, int dx = 0, int dy = 0) {
   return [space, &s, dx, dy](int x, int y) {
-    auto v = [&](int c) { return s.at(c, x + dx, y + dy); };
-    switch (space) {
-      case kColourGrey:
-        return Colour{false, v(0), v(0), v(0)};
-      case kColourRgb:
-        return Colour{false, v(0), v(1), v(2)};
-      case kColourCmyk:
-        return cmyk_colour(v(0), v(1), v(2), v(3));
-      case kColourYcck:
-        return ycck_colour(v(0), v(1), v(2), v(3));
-      default:
-        return Colour{true, v(0), v(1), v(2)};
-    }
+    const auto v = [&](int c) { return s.at(c, x + dx, y + dy); };
+    if (space == kColourGrey) return Colour{false, v(0), v(0), v(0)};
+    if (space == kColourYcc || space == kColourRgb)
+      return Colour{space == kColourYcc, v(0), v(1), v(2)};
+    return (space == kColourCmyk ? cmyk_colour : ycck_colour)(v(0), v(1), v(2), v(3));
   };
 }
 
@@ -224,8 +216,10 @@ TEST_P(Layout, ConvertersWriteEveryFormatAndRotation) {
     Fixture f(space);
     ASSERT_EQ(f.select(sw, sh, dw, dh), 200);
     Canvas canvas = f.attach(format, rotation);
-    Planes s(components_of(space), sw, sh, uint32_t(space * 31 + sw));
+    // At 1:1 three rows too many are handed over: they are not written.
+    Planes s(components_of(space), sw, sh + (sw == dw ? 3 : 0), uint32_t(space * 31 + sw));
     f.feed(s);
+    s.h = sh;
     EXPECT_TRUE(canvas.holds(f.resized(space, s)));
     EXPECT_EQ(f.d->output_rows, uint32_t(dh));
   }
@@ -363,16 +357,6 @@ TEST(Cursor, ZeroRowBatchOnlyClearsTheMoreOutputFlag) {
   EXPECT_EQ(f.d->resampler->src_row, 0u);
   EXPECT_TRUE(
       std::all_of(canvas.buf.begin(), canvas.buf.end(), [](uint8_t b) { return b == kFill; }));
-}
-
-TEST(Cursor, RowsBeyondTheVisibleHeightAreNotWritten) {
-  Fixture f(kColourGrey);
-  ASSERT_EQ(f.select(6, 3, 6, 3), 200);
-  Canvas canvas = f.attach(8, 8);
-  Planes s(1, 6, 7, 5);
-  f.feed(s);  // four rows too many
-  EXPECT_EQ(f.d->output_rows, 3u);
-  EXPECT_TRUE(canvas.holds(source_colours(kColourGrey, s)));
 }
 
 // Calls wider than the visible width (the row length of a buffer larger

@@ -13,7 +13,6 @@
 
 #include "drivers/decode.h"
 #include "support/decoding.h"
-#include "support/encoder.h"
 #include "support/files.h"
 
 namespace {
@@ -60,8 +59,9 @@ INSTANTIATE_TEST_SUITE_P(FormatsAndRotations, Placed,
                          ::testing::Combine(::testing::Values(0, 1, 2, 3, 5, 7, 8, 9, 12),
                                             ::testing::Values(0u, 4u, 8u, 12u)));
 
-// Fit modes, cropping and resizing on the 96x64 4:2:0 fixture. Outputs of at
-// most 99x99 pixels take centre sampling, larger ones the averages.
+// Fit modes, cropping and resizing (on the 96x64 4:2:0 fixture unless
+// named). Outputs of at most 99x99 pixels take centre sampling, larger ones
+// the averages.
 struct FitCase {
   const char* label;
   uint32_t options;                     // fit mode and rotation
@@ -73,6 +73,7 @@ struct FitCase {
   // Centred in the buffer, at its top-left corner, or at its top-left with
   // the row length of the visible width (fit mode 0x100).
   enum Where { kCentred, kTopLeft, kRowLength } where;
+  const char* fixture = "base_420_q90_96x64.jpg";
 };
 using enum FitCase::Where;
 
@@ -99,6 +100,17 @@ const FitCase kFitCases[] = {
     // Fill with the picture narrower than the buffer but taller: centred
     // across, 50 of its 64 rows shown from row 7.
     {"fill_crops_height_only", 0x300, 120, 50, 96, 64, 96, 50, 0, 7, 96, 50, kCentre, kCentred},
+    // Fill shows a window of ceil(visible x picture / fitted size) source
+    // pixels from the middle of the picture (at odd offsets too); the rows
+    // above a vertical crop are decoded and dropped.
+    {"fill_reduced_crops_rows", 0x300, 10, 10, 10, 602, 10, 10, 0, 503, 17, 17, kCentre, kCentred,
+     "base_420_q88_17x1023.jpg"},
+    {"fill_reduced_odd_column", 0x300, 701, 600, 800, 600, 701, 600, 63, 0, 898, 768, kAverage,
+     kCentred, "base_420_q90_1024x768.jpg"},
+    {"fill_crops_columns_only", 0x300, 100, 100, 1023, 17, 100, 17, 461, 0, 100, 17, kCentre,
+     kCentred, "base_420_q81_1023x17.jpg"},
+    {"fill_crops_rows_only", 0x300, 100, 100, 17, 1023, 17, 100, 0, 461, 17, 100, kCentre, kCentred,
+     "base_420_q88_17x1023.jpg"},
 };
 
 void PrintTo(const FitCase& c, std::ostream* os) { *os << c.label; }
@@ -107,7 +119,7 @@ class FitModes : public ::testing::TestWithParam<std::tuple<FitCase, int>> {};
 
 TEST_P(FitModes, PlaceAndResampleTheVisiblePicture) {
   const auto& [c, format] = GetParam();
-  const Bytes jpeg = read_fixture("base_420_q90_96x64.jpg");
+  const Bytes jpeg = read_fixture(c.fixture);
   FullPicture full;
   ASSERT_TRUE(full_picture(jpeg, &full));
   const Decoded d = decode_bytes(jpeg, {.format = format,
@@ -154,41 +166,6 @@ TEST(FitModes, CountOnlyFormatWritesNothing) {
     }
   }
 }
-
-#if VETAJ_HAVE_LIBJPEG
-
-// Fill mode on pictures whose overhang is cropped in either direction: a
-// 400x300 picture into 200x200 is fitted at 267x200 and shows 300 of its
-// columns from column 50; a 300x400 picture shows 300 rows from row 50 (the
-// rows above are decoded and dropped); a 303x200 picture into 100x100 shows
-// 200 columns from the odd column 51.
-TEST(FillMode, CropsHalfTheOverhangOnEachSide) {
-  struct Case {
-    int w, h, buffer, out_w, out_h, left, top, window;
-  };
-  for (const Case& c :
-       {Case{400, 300, 200, 267, 200, 50, 0, 300}, Case{300, 400, 200, 200, 267, 0, 50, 300},
-        Case{303, 200, 100, 152, 100, 51, 0, 200}}) {
-    const Bytes jpeg = encode_synthetic(c.w, c.h);
-    FullPicture full;
-    ASSERT_TRUE(full_picture(jpeg, &full));
-    for (const int format : {KOLVAVETA_FMT_RGBA8888, KOLVAVETA_FMT_YUV420}) {
-      SCOPED_TRACE(testing::Message() << c.w << "x" << c.h << " format " << format);
-      const Decoded d =
-          decode_bytes(jpeg, {.format = format,
-                              .width = c.buffer,
-                              .height = c.buffer,
-                              .options = KOLVAVETA_OPT_THUMB_NEVER | KOLVAVETA_OPT_FIT_FILL});
-      EXPECT_EQ(d.output_width, c.out_w);
-      EXPECT_EQ(d.output_height, c.out_h);
-      EXPECT_TRUE(shows(
-          d, Placement::centred(format, c.buffer, c.buffer, c.buffer, c.buffer),
-          resampled(full.at, kAverage, c.left, c.top, c.window, c.window, c.buffer, c.buffer)));
-    }
-  }
-}
-
-#endif  // VETAJ_HAVE_LIBJPEG
 
 // Sizes that need the reduced transform (whose pixels the scaled tests
 // check): the reported size follows the fit rules and exactly the visible
