@@ -198,7 +198,8 @@ TEST(ColourEquations, KnownValues) {
 }
 
 // ---------------------------------------------------------------------------
-// Every format, every rotation, every path.
+// Every format and rotation (the fused writers are checked by the whole-
+// picture tests).
 
 class Layout : public ::testing::TestWithParam<std::tuple<int, uint32_t>> {};
 
@@ -222,37 +223,6 @@ TEST_P(Layout, ConvertersWriteEveryFormatAndRotation) {
     s.h = sh;
     EXPECT_TRUE(canvas.holds(f.resized(space, s)));
     EXPECT_EQ(f.d->output_rows, uint32_t(dh));
-  }
-}
-
-// The fused writers: every chroma layout, odd and even widths, an odd
-// height (the last two-row call writes one row).
-TEST_P(Layout, FusedWritersWriteEveryFormatAndRotation) {
-  const auto [format, rotation] = GetParam();
-  struct Family {
-    int code, h, v;
-  };
-  for (const Family fam : {Family{1, 2, 2}, Family{2, 2, 1}, Family{3, 1, 2}, Family{4, 1, 1}}) {
-    for (const int w : {1, 2, 7, 16}) {
-      SCOPED_TRACE(testing::Message() << "fused code " << fam.code << " width " << w);
-      const int h = 5, padded_h = 6;
-      Fixture f(kColourYcc);
-      ASSERT_EQ(f.select(w, h, w, h), 200);
-      Canvas canvas = f.attach(format, rotation);
-      Planes luma(1, w, padded_h, uint32_t(w + 7 * fam.code));
-      Planes chroma(2, (w + fam.h - 1) / fam.h, padded_h / fam.v, uint32_t(w * 3 + fam.code));
-      const FusedWriterFn writer = vj_select_fused_writer(fam.code, format);
-      ASSERT_NE(writer, nullptr);
-      for (int y = 0; y < h; y += fam.v) {
-        writer(f.d.get(), luma.row(0, y), fam.v == 2 ? luma.row(0, y + 1) : nullptr,
-               chroma.row(0, y / fam.v), chroma.row(1, y / fam.v), uint32_t(w));
-      }
-      EXPECT_TRUE(canvas.holds([&](int x, int y) {
-        return Colour{true, luma.at(0, x, y), chroma.at(0, x / fam.h, y / fam.v),
-                      chroma.at(1, x / fam.h, y / fam.v)};
-      }));
-      EXPECT_EQ(f.d->output_rows, uint32_t(h));
-    }
   }
 }
 
@@ -291,6 +261,9 @@ INSTANTIATE_TEST_SUITE_P(
                       std::make_tuple(kColourRgb, 0), std::make_tuple(kColourCmyk, 0),
                       std::make_tuple(kColourYcck, 4)));
 
+// YCbCr takes centre sampling for outputs of at most 99x99 pixels, in mode
+// 2 and in mode 1 within 12/7 of the picture, else the averages; regions
+// take the partial converters.
 TEST(ConverterChoice, FollowsSizeModeAndRegion) {
   struct Case {
     int space, sw, sh, dw, dh, mode;
@@ -309,15 +282,9 @@ TEST(ConverterChoice, FollowsSizeModeAndRegion) {
       {kColourYcc, 50, 50, 60, 60, 1, false, VETAJ_DoYcbcrToUpscaleRgb},
       {kColourYcc, 50, 50, 300, 300, 2, true, VETAJ_DoFastYcbcrToUpscaleRgb},
       {kColourYcc, 200, 50, 100, 60, 0, false, VETAJ_DoYcbcrToUpscaleRgb},
-      {kColourGrey, 200, 200, 100, 100, 0, false, VETAJ_DoGrayConvert},
       {kColourGrey, 200, 200, 100, 100, 3, true, VETAJ_DoGrayConvert_Partial},
-      {kColourGrey, 20, 20, 100, 10, 0, false, VETAJ_DoGrayUpscaleConvert},
-      {kColourRgb, 200, 200, 100, 100, 0, false, VETAJ_DoRgbConvert},
       {kColourRgb, 200, 200, 100, 100, 0, true, VETAJ_DoRgbConvert_Partial},
-      {kColourRgb, 20, 20, 21, 20, 0, false, VETAJ_DoRgbUpscaleConvert},
-      {kColourCmyk, 20, 20, 80, 80, 0, false, VETAJ_DoCMYKToRgb},
       {kColourCmyk, 20, 20, 10, 10, 0, true, VETAJ_DoCMYKToRgb_Partial},
-      {kColourYcck, 20, 20, 80, 80, 2, false, VETAJ_DoYCCKToRgb},
       {kColourYcck, 20, 20, 20, 20, 0, true, VETAJ_DoYCCKToRgb_Partial},
   };
   for (const Case& c : cases) {

@@ -23,12 +23,12 @@ struct Colour {
   bool ycc = false;
   int a = 0, b = 0, c = 0;
 };
-// YCbCr to RGB with 16-bit constants and arithmetic shifts.
+// YCbCr to RGB with 16-bit constants and arithmetic shifts; RGB to YCbCr
+// with 12-bit constants (the planar writers of RGB sources).
 Colour rgb_of(const Colour& colour);
-// RGB to YCbCr with 12-bit constants (the planar writers of RGB sources).
 Colour ycc_of(const Colour& colour);
-// CMYK (not inverted) and YCCK samples as RGB: each channel times K / 255,
-// YCCK through the inverted YCbCr equations with the black applied by K / 256.
+// CMYK (not inverted) as RGB: each channel times K / 255. YCCK: the inverted
+// YCbCr equations, times K / 256.
 Colour cmyk_colour(int c, int m, int y, int k);
 Colour ycck_colour(int y, int cb, int cr, int k);
 
@@ -41,6 +41,7 @@ int pixel_bytes(int format);
 // Bytes of a buffer of width x height pixels (planar: Y plane and both
 // chroma planes).
 size_t buffer_bytes(int format, int width, int height);
+
 // Where a decode's output lands in the caller's buffer.
 struct Placement {
   int format = 7;
