@@ -1,6 +1,7 @@
 #include "support/pictures.h"
 
 #include <algorithm>
+#include <cstring>
 
 namespace vjtest {
 namespace {
@@ -17,11 +18,10 @@ void store_pixel(int format, const Colour& rgb, uint8_t* at) {
     return;
   }
   const char* order = bytes == 3 ? "RGB" : format == 5 ? "ARGB" : format == 8 ? "BGRA" : "RGBA";
+  static constexpr char kLetters[] = "RGBA";
+  const int value[4] = {rgb.a, rgb.b, rgb.c, 255};
   for (int i = 0; i < bytes; ++i)
-    at[i] = uint8_t(order[i] == 'R'   ? rgb.a
-                    : order[i] == 'G' ? rgb.b
-                    : order[i] == 'B' ? rgb.c
-                                      : 255);
+    at[i] = uint8_t(value[std::strchr(kLetters, order[i]) - kLetters]);
 }
 
 }  // namespace
