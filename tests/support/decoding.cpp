@@ -1,20 +1,25 @@
 #include "support/decoding.h"
 
 #include <algorithm>
-#include <memory>
 
 #if VETAJ_HAVE_LIBJPEG
 #include "support/oracle.h"
 #endif
 
 namespace vjtest {
-namespace {
 
-constexpr size_t kGuardBytes = 64;
+void ObjectCloser::operator()(DecInfo* object) const {
+  KOLVAVETA_DestroyJpegInfo(object);
+  KOLVAVETA_DestroyDecInfo(object);
+}
 
-}  // namespace
+Object open_memory(const Bytes& jpeg, int format, uint32_t options) {
+  return Object(KOLVAVETA_CreateDecInfo(KOLVAVETA_IO_MEMORY, const_cast<uint8_t*>(jpeg.data()),
+                                        uint32_t(jpeg.size()), format, options));
+}
 
 Decoded decode_on(DecInfo* object, const DecodeRequest& r) {
+  constexpr size_t kGuardBytes = 64;
   Decoded out;
   if (object == nullptr) return out;
   object->output_format = r.format;
@@ -28,10 +33,10 @@ Decoded decode_on(DecInfo* object, const DecodeRequest& r) {
   out.output_width = object->output_width;
   out.output_height = object->output_height;
   out.image_width = object->image_width;
-  out.image_height = object->image_height;
   out.options = object->options;
   out.decode_mode = object->decode_mode;
   out.sample_size = object->sample_size;
+  out.kept_decoder = object->decoder != nullptr;
   out.guard_intact = std::all_of(out.buffer.begin() + std::ptrdiff_t(bytes), out.buffer.end(),
                                  [](uint8_t b) { return b == kFill; });
   out.buffer.resize(bytes);
@@ -39,36 +44,37 @@ Decoded decode_on(DecInfo* object, const DecodeRequest& r) {
 }
 
 Decoded decode_bytes(const Bytes& jpeg, const DecodeRequest& request) {
-  DecInfo* object = KOLVAVETA_CreateDecInfo(KOLVAVETA_IO_MEMORY, const_cast<uint8_t*>(jpeg.data()),
-                                            uint32_t(jpeg.size()), request.format, request.options);
-  if (object == nullptr) {
-    Decoded failed;
-    failed.error = gKOLVAVETA_Error;
-    return failed;
-  }
-  Decoded out = decode_on(object, request);
-  KOLVAVETA_DestroyJpegInfo(object);
-  KOLVAVETA_DestroyDecInfo(object);
+  const Object object = open_memory(jpeg, request.format, request.options);
+  Decoded out = decode_on(object.get(), request);
+  if (object == nullptr) out.error = gKOLVAVETA_Error;
   return out;
 }
 
-Decoded decode_full(const Bytes& jpeg, int width, int height, int format) {
-  DecodeRequest r;
-  r.format = format;
-  r.width = width;
-  r.height = height;
-  return decode_bytes(jpeg, r);
+::testing::AssertionResult shows(const Decoded& d, const Placement& where, const ColourAt& colour) {
+  if (d.ok != 1) return ::testing::AssertionFailure() << "decode failed, error " << d.error;
+  if (!d.guard_intact) return ::testing::AssertionFailure() << "written behind the buffer";
+  return same_output(d.buffer, expected_buffer(where, colour));
+}
+
+bool frame_size(const Bytes& jpeg, int* width, int* height) {
+  const Object object = open_memory(jpeg);
+  JpegInfo info{};
+  const bool known = object != nullptr && KOLVAVETA_JpgParser(object.get(), &info) == 1 &&
+                     info.width > 0 && info.height > 0;
+  *width = info.width;
+  *height = info.height;
+  return known;
 }
 
 bool full_picture(const Bytes& jpeg, FullPicture* out) {
 #if VETAJ_HAVE_LIBJPEG
   OracleHeader h;
   if (!oracle_header(jpeg, &h)) return false;
-  out->width = h.width;
-  out->height = h.height;
   if (h.jpeg_color_space == 3 /* YCbCr */) {
     auto planes = std::make_shared<OraclePlanes>();
     if (!oracle_planes(jpeg, 1, planes.get())) return false;
+    out->width = h.width;
+    out->height = h.height;
     out->at = [planes](int x, int y) {
       return Colour{true, planes->at(x, y, 0), planes->at(x, y, 1), planes->at(x, y, 2)};
     };
@@ -77,28 +83,15 @@ bool full_picture(const Bytes& jpeg, FullPicture* out) {
 #endif
   // Other colour spaces (and every frame when libjpeg is missing): the
   // library's own decode at the size the header summary reports.
-  auto rgba = std::make_shared<Decoded>();
-  DecInfo* object = KOLVAVETA_CreateDecInfo(KOLVAVETA_IO_MEMORY, const_cast<uint8_t*>(jpeg.data()),
-                                            uint32_t(jpeg.size()), KOLVAVETA_FMT_RGBA8888,
-                                            KOLVAVETA_OPT_THUMB_NEVER);
-  if (object == nullptr) return false;
-  JpegInfo info{};
-  const bool known = KOLVAVETA_JpgParser(object, &info) == 1;
-  if (known) {
-    DecodeRequest r;
-    r.width = info.width;
-    r.height = info.height;
-    *rgba = decode_on(object, r);
-  }
-  KOLVAVETA_DestroyJpegInfo(object);
-  KOLVAVETA_DestroyDecInfo(object);
-  if (!known || rgba->ok != 1) return false;
-  out->width = info.width;
-  out->height = info.height;
-  const int row = info.width;
-  out->at = [rgba, row](int x, int y) {
-    return load_pixel(KOLVAVETA_FMT_RGBA8888,
-                      &rgba->buffer[(size_t(y) * size_t(row) + size_t(x)) * 4]);
+  int w = 0, rows = 0;
+  if (!frame_size(jpeg, &w, &rows)) return false;
+  auto rgba = std::make_shared<Decoded>(decode_bytes(jpeg, {.width = w, .height = rows}));
+  if (rgba->ok != 1) return false;
+  out->width = w;
+  out->height = rows;
+  out->at = [rgba, w](int x, int y) {
+    const uint8_t* p = &rgba->buffer[(size_t(y) * size_t(w) + size_t(x)) * 4];
+    return Colour{false, p[0], p[1], p[2]};
   };
   return true;
 }

@@ -5,6 +5,7 @@
 #define VETAJ_TESTS_SUPPORT_DECODING_H
 
 #include <cstdint>
+#include <memory>
 #include <vector>
 
 #include "VetaJpegDecoder.h"
@@ -13,6 +14,15 @@
 namespace vjtest {
 
 using Bytes = std::vector<uint8_t>;
+
+// A decoder object, destroyed with its header summary.
+struct ObjectCloser {
+  void operator()(DecInfo* object) const;
+};
+using Object = std::unique_ptr<DecInfo, ObjectCloser>;
+// An object over a memory image (which must outlive it).
+Object open_memory(const Bytes& jpeg, int format = KOLVAVETA_FMT_RGBA8888,
+                   uint32_t options = KOLVAVETA_OPT_THUMB_NEVER);
 
 struct DecodeRequest {
   int format = KOLVAVETA_FMT_RGBA8888;
@@ -27,12 +37,13 @@ struct Decoded {
   int ok = 0;
   int error = 0;
   int output_width = 0, output_height = 0;
-  int image_width = 0, image_height = 0;
+  int image_width = 0;
   uint32_t options = 0;
   int decode_mode = 0;
   uint32_t sample_size = 0;
   std::vector<uint8_t> buffer;  // buffer_bytes(format, width, height), filled with kFill first
   bool guard_intact = true;     // nothing was written behind the buffer
+  bool kept_decoder = false;    // the object holds a decoder afterwards
 };
 
 // Decodes on an existing object after setting its format, options, mode and
@@ -40,8 +51,14 @@ struct Decoded {
 Decoded decode_on(DecInfo* object, const DecodeRequest& request);
 // Decodes a memory image on a fresh object.
 Decoded decode_bytes(const Bytes& jpeg, const DecodeRequest& request);
-// A fixture decoded at its own size into a buffer of that size.
-Decoded decode_full(const Bytes& jpeg, int width, int height, int format = KOLVAVETA_FMT_RGBA8888);
+
+// The decode succeeded, wrote nothing behind its buffer and left exactly the
+// buffer that `where` and `colour` describe.
+::testing::AssertionResult shows(const Decoded& decoded, const Placement& where,
+                                 const ColourAt& colour);
+
+// The frame size from the header summary; false when there is none.
+bool frame_size(const Bytes& jpeg, int* width, int* height);
 
 // The whole picture of a stream at full size: YCbCr frames as libjpeg's
 // samples (box upsampling), other colour spaces as the library's own

@@ -1,33 +1,36 @@
 #include "support/pictures.h"
 
 #include <algorithm>
+#include <cstring>
 
 namespace vjtest {
 namespace {
 
 int clamp255(int64_t v) { return v < 0 ? 0 : v > 255 ? 255 : int(v); }
 
-// Bytes per pixel by format code (planar: its luma byte).
-constexpr int kPixelBytes[13] = {2, 3, 1, 3, 0, 4, 3, 4, 4, 2, 2, 3, 4};
-
-// Memory order of the four-byte formats: 'R', 'G', 'B' or 'A' per byte.
-const char* quad_order(int format) {
-  switch (format) {
-    case 5:
-      return "ARGB";
-    case 8:
-      return "BGRA";
-    default:
-      return "RGBA";
+// Stores one pixel of a packed format.
+void store_pixel(int format, const Colour& rgb, uint8_t* at) {
+  const int bytes = pixel_bytes(format);
+  if (bytes == 2) {
+    const int v = ((rgb.a >> 3) << 11) | ((rgb.b >> 2) << 5) | (rgb.c >> 3);
+    at[0] = uint8_t(v);
+    at[1] = uint8_t(v >> 8);
+    return;
   }
+  const char* order = bytes == 3 ? "RGB" : format == 5 ? "ARGB" : format == 8 ? "BGRA" : "RGBA";
+  static constexpr char kLetters[] = "RGBA";
+  const int value[4] = {rgb.a, rgb.b, rgb.c, 255};
+  for (int i = 0; i < bytes; ++i)
+    at[i] = uint8_t(value[std::strchr(kLetters, order[i]) - kLetters]);
 }
 
 }  // namespace
 
-Rgb rgb_of(const Colour& c) {
-  if (!c.ycc) return {c.a, c.b, c.c};
+Colour rgb_of(const Colour& c) {
+  if (!c.ycc) return c;
   const int64_t cb = c.b - 128, cr = c.c - 128;
-  return {clamp255(c.a + ((91881 * cr) >> 16)), clamp255(c.a + ((-22554 * cb - 46802 * cr) >> 16)),
+  return {false, clamp255(c.a + ((91881 * cr) >> 16)),
+          clamp255(c.a + ((-22554 * cb - 46802 * cr) >> 16)),
           clamp255(c.a + ((116130 * cb) >> 16))};
 }
 
@@ -39,7 +42,22 @@ Colour ycc_of(const Colour& c) {
           ((2048 * r - 1715 * g - 333 * b) >> 12) + 128};
 }
 
-int pixel_bytes(int format) { return format >= 0 && format < 13 ? kPixelBytes[format] : 0; }
+Colour cmyk_colour(int c, int m, int y, int k) {
+  return {false, c * k / 255, m * k / 255, y * k / 255};
+}
+
+Colour ycck_colour(int y, int cb, int cr, int k) {
+  // The 128 offsets of the chroma are folded into the constants.
+  const int64_t Y = y, K = k;
+  return {false, int(K * clamp255(433 - Y - ((91881 * int64_t(cr)) >> 16)) >> 8),
+          int(K * clamp255(120 - Y - ((-22554 * int64_t(cb) - 46802 * int64_t(cr)) >> 16)) >> 8),
+          int(K * clamp255(481 - Y - ((116130 * int64_t(cb)) >> 16)) >> 8)};
+}
+
+int pixel_bytes(int format) {
+  constexpr int kBytes[13] = {2, 3, 1, 3, 0, 4, 3, 4, 4, 2, 2, 3, 4};
+  return format >= 0 && format < 13 ? kBytes[format] : 0;
+}
 
 size_t buffer_bytes(int format, int width, int height) {
   const size_t w = size_t(width), h = size_t(height);
@@ -47,92 +65,22 @@ size_t buffer_bytes(int format, int width, int height) {
   return w * h * size_t(pixel_bytes(format));
 }
 
-void store_pixel(int format, const Rgb& c, uint8_t* at) {
-  switch (pixel_bytes(format)) {
-    case 2: {
-      const int v = ((c.r >> 3) << 11) | ((c.g >> 2) << 5) | (c.b >> 3);
-      at[0] = uint8_t(v);
-      at[1] = uint8_t(v >> 8);
-      return;
-    }
-    case 3:
-      at[0] = uint8_t(c.r);
-      at[1] = uint8_t(c.g);
-      at[2] = uint8_t(c.b);
-      return;
-    case 4: {
-      const char* order = quad_order(format);
-      for (int i = 0; i < 4; ++i)
-        at[i] = uint8_t(order[i] == 'R'   ? c.r
-                        : order[i] == 'G' ? c.g
-                        : order[i] == 'B' ? c.b
-                                          : 255);
-      return;
-    }
-    default:
-      return;
-  }
-}
-
-Colour load_pixel(int format, const uint8_t* at) {
-  switch (pixel_bytes(format)) {
-    case 2: {
-      const int v = at[0] | (at[1] << 8);
-      return {false, (v >> 11) << 3, ((v >> 5) & 63) << 2, (v & 31) << 3};
-    }
-    case 3:
-      return {false, at[0], at[1], at[2]};
-    case 4: {
-      const char* order = quad_order(format);
-      int rgb[3] = {};
-      for (int i = 0; i < 4; ++i) {
-        if (order[i] == 'R') rgb[0] = at[i];
-        if (order[i] == 'G') rgb[1] = at[i];
-        if (order[i] == 'B') rgb[2] = at[i];
-      }
-      return {false, rgb[0], rgb[1], rgb[2]};
-    }
-    default:
-      return {};
-  }
-}
-
 Placement Placement::centred(int format, int buffer_width, int buffer_height, int output_width,
                              int output_height, uint32_t rotation) {
   const bool quarter = rotation == 4 || rotation == 12;
   const int box_w = quarter ? output_height : output_width;
   const int box_h = quarter ? output_width : output_height;
-  Placement p;
-  p.format = format;
-  p.buffer_width = buffer_width;
-  p.buffer_height = buffer_height;
-  p.output_width = output_width;
-  p.output_height = output_height;
+  Placement p{format, buffer_width, buffer_height, output_width, output_height, 0, 0, rotation};
   p.left = std::max(0, (buffer_width - box_w) / 2);
   p.top = std::max(0, (buffer_height - box_h) / 2);
-  p.rotation = rotation;
   return p;
 }
 
 void Placement::locate(int x, int y, int* bx, int* by) const {
-  switch (rotation) {
-    case 4:  // 90 degrees clockwise
-      *bx = left + output_height - 1 - y;
-      *by = top + x;
-      return;
-    case 8:
-      *bx = left + output_width - 1 - x;
-      *by = top + output_height - 1 - y;
-      return;
-    case 12:  // 270 degrees clockwise
-      *bx = left + y;
-      *by = top + output_width - 1 - x;
-      return;
-    default:
-      *bx = left + x;
-      *by = top + y;
-      return;
-  }
+  const int w = output_width, h = output_height;
+  const int turned[4][2] = {{x, y}, {h - 1 - y, x}, {w - 1 - x, h - 1 - y}, {y, w - 1 - x}};
+  *bx = left + turned[rotation / 4 % 4][0];
+  *by = top + turned[rotation / 4 % 4][1];
 }
 
 std::vector<uint8_t> expected_buffer(const Placement& p, const ColourAt& colour) {
@@ -147,13 +95,12 @@ std::vector<uint8_t> expected_buffer(const Placement& p, const ColourAt& colour)
     for (int x = 0; x < p.output_width; ++x) {
       int bx = 0, by = 0;
       p.locate(x, y, &bx, &by);
-      const Colour c = colour(x, y);
       const size_t at = size_t(by) * bw + size_t(bx);
       if (p.format != 2) {
-        store_pixel(p.format, rgb_of(c), &out[at * size_t(bpp)]);
+        store_pixel(p.format, rgb_of(colour(x, y)), &out[at * size_t(bpp)]);
         continue;
       }
-      const Colour yuv = ycc_of(c);
+      const Colour yuv = ycc_of(colour(x, y));
       out[at] = uint8_t(yuv.a);
       size_t chroma = SIZE_MAX;
       if (p.rotation == 0 && x % 2 == 0 && y % 2 == 0)
@@ -170,32 +117,17 @@ std::vector<uint8_t> expected_buffer(const Placement& p, const ColourAt& colour)
 }
 
 ::testing::AssertionResult same_output(const std::vector<uint8_t>& actual,
-                                       const std::vector<uint8_t>& expected, const Placement& p) {
+                                       const std::vector<uint8_t>& expected) {
   if (actual.size() != expected.size())
     return ::testing::AssertionFailure()
            << "buffer of " << actual.size() << " bytes, expected " << expected.size();
-  size_t diffs = 0, first = 0;
-  for (size_t i = 0; i < actual.size(); ++i)
-    if (actual[i] != expected[i] && diffs++ == 0) first = i;
-  if (diffs == 0) return ::testing::AssertionSuccess();
-  // Name the plane and pixel of the first difference.
-  const size_t bw = size_t(p.buffer_width), bh = size_t(p.buffer_height);
-  std::string where;
-  if (p.format == 2) {
-    const size_t luma = bw * bh, cs = (bw + 1) / 2, plane = cs * ((bh + 1) / 2);
-    const size_t in_plane = first < luma ? first : (first - luma) % plane;
-    const size_t row_length = first < luma ? bw : cs;
-    where = std::string(first < luma             ? "Y"
-                        : (first - luma) < plane ? "U"
-                                                 : "V") +
-            " plane (" + std::to_string(in_plane % row_length) + "," +
-            std::to_string(in_plane / row_length) + ")";
-  } else {
-    const size_t px = first / size_t(std::max(1, pixel_bytes(p.format)));
-    where = "pixel (" + std::to_string(px % bw) + "," + std::to_string(px / bw) + ")";
-  }
+  const auto [differs, _] = std::mismatch(actual.begin(), actual.end(), expected.begin());
+  if (differs == actual.end()) return ::testing::AssertionSuccess();
+  const size_t first = size_t(differs - actual.begin());
+  size_t diffs = 0;
+  for (size_t i = first; i < actual.size(); ++i) diffs += actual[i] != expected[i];
   return ::testing::AssertionFailure()
-         << diffs << " bytes differ; first at " << where << ": " << int(actual[first])
+         << diffs << " bytes differ; first at byte " << first << ": " << int(actual[first])
          << " instead of " << int(expected[first]);
 }
 
@@ -217,20 +149,10 @@ ColourAt resampled(const ColourAt& source, Sampling sampling, int left, int top,
     for (const int yy : ys) {
       for (const int xx : xs) {
         const Colour c = source(left + xx, top + yy);
-        sum.ycc = c.ycc;
-        sum.a += c.a;
-        sum.b += c.b;
-        sum.c += c.c;
+        sum = {c.ycc, sum.a + c.a, sum.b + c.b, sum.c + c.c};
       }
     }
     return Colour{sum.ycc, sum.a / 4, sum.b / 4, sum.c / 4};
-  };
-}
-
-ColourAt colours_of(const std::vector<uint8_t>& buffer, int format, int row_length) {
-  const int bpp = pixel_bytes(format);
-  return [&buffer, format, row_length, bpp](int x, int y) {
-    return load_pixel(format, &buffer[(size_t(y) * size_t(row_length) + size_t(x)) * size_t(bpp)]);
   };
 }
 

@@ -1,7 +1,7 @@
-// Expected output buffers for whole-image decodes: pixel colours, the
-// layouts of the output formats, placement in the caller's buffer
-// (centring, row length, rotation) and the resampling rules of the row
-// converters, all written from their definitions.
+// Expected output buffers: pixel colours from the colour equations, the
+// layouts of the output formats, placement in the caller's buffer (centring,
+// row length, rotation) and the resampling rules of the row converters, all
+// written from their definitions.
 #ifndef VETAJ_TESTS_SUPPORT_PICTURES_H
 #define VETAJ_TESTS_SUPPORT_PICTURES_H
 
@@ -10,7 +10,6 @@
 #include <cstddef>
 #include <cstdint>
 #include <functional>
-#include <string>
 #include <vector>
 
 namespace vjtest {
@@ -24,13 +23,14 @@ struct Colour {
   bool ycc = false;
   int a = 0, b = 0, c = 0;
 };
-struct Rgb {
-  int r, g, b;
-};
-// YCbCr to RGB with 16-bit constants and arithmetic shifts.
-Rgb rgb_of(const Colour& colour);
-// RGB to YCbCr with 12-bit constants (the planar writers of RGB sources).
+// YCbCr to RGB with 16-bit constants and arithmetic shifts; RGB to YCbCr
+// with 12-bit constants (the planar writers of RGB sources).
+Colour rgb_of(const Colour& colour);
 Colour ycc_of(const Colour& colour);
+// CMYK (not inverted) as RGB: each channel times K / 255. YCCK: the inverted
+// YCbCr equations, times K / 256.
+Colour cmyk_colour(int c, int m, int y, int k);
+Colour ycck_colour(int y, int cb, int cr, int k);
 
 // Colour of output pixel (x, y) before rotation.
 using ColourAt = std::function<Colour(int x, int y)>;
@@ -41,11 +41,6 @@ int pixel_bytes(int format);
 // Bytes of a buffer of width x height pixels (planar: Y plane and both
 // chroma planes).
 size_t buffer_bytes(int format, int width, int height);
-// Stores one pixel of a packed format.
-void store_pixel(int format, const Rgb& rgb, uint8_t* at);
-// Reads one pixel of a packed format back (RGB565 as the 8-bit values whose
-// top bits it keeps).
-Colour load_pixel(int format, const uint8_t* at);
 
 // Where a decode's output lands in the caller's buffer.
 struct Placement {
@@ -67,10 +62,9 @@ struct Placement {
 // coordinates (rotated).
 std::vector<uint8_t> expected_buffer(const Placement& where, const ColourAt& colour);
 
-// Compares two buffers of a placement, naming the first differing pixel.
+// Compares two buffers, naming the first differing byte.
 ::testing::AssertionResult same_output(const std::vector<uint8_t>& actual,
-                                       const std::vector<uint8_t>& expected,
-                                       const Placement& where);
+                                       const std::vector<uint8_t>& expected);
 
 // Resampling rules of the row converters. Output index j of a destination of
 // d samples over a source of s samples takes:
@@ -83,10 +77,6 @@ enum class Sampling { kCentre, kAverage };
 // are taken per channel with truncation, in the colour's own space.
 ColourAt resampled(const ColourAt& source, Sampling sampling, int left, int top, int sw, int sh,
                    int dw, int dh);
-
-// A colour function reading an unrotated decode in a packed format with
-// the given row length. The buffer must outlive the function.
-ColourAt colours_of(const std::vector<uint8_t>& buffer, int format, int row_length);
 
 }  // namespace vjtest
 
