@@ -278,7 +278,8 @@ struct Gen {
         b.coef[i] = static_cast<int16_t>(rng());
         b.mult[i] = static_cast<uint32_t>(rng());
       } else if (kind == kExtreme) {
-        b.coef[i] = static_cast<int16_t>(pick < 2 ? (pick ? 2047 : -2047) : pick == 2 ? 0 : uniform(-2047, 2047));
+        const int v = pick == 0 ? 2047 : pick == 1 ? -2047 : pick == 2 ? 0 : uniform(-2047, 2047);
+        b.coef[i] = static_cast<int16_t>(v);
         b.mult[i] = static_cast<uint32_t>(uniform(0, 3) ? uniform(1, 65535) : 65535);
       } else {
         b.coef[i] = static_cast<int16_t>(pick == 0 ? 0 : uniform(-amp, amp));
@@ -421,7 +422,8 @@ Samples float_idct(const Block& b, int w, int h) {
       double sum = 0;
       for (int v = 0; v < h; ++v)
         for (int u = 0; u < w; ++u) sum += double(b.d(v, u)) * basis(u, x, w) * basis(v, y, h);
-      s[static_cast<size_t>(y * w + x)] = static_cast<uint8_t>(std::clamp(std::round(sum / 8 + 128), 0.0, 255.0));
+      const double f = std::clamp(std::round(sum / 8 + 128), 0.0, 255.0);
+      s[static_cast<size_t>(y * w + x)] = static_cast<uint8_t>(f);
     }
   }
   return s;
@@ -563,7 +565,9 @@ TEST(RangeLimit, ChromaTableCompressesEveryEntry) {
 }
 
 TEST(Aan, ScaleTableAndMultipliers) {
-  auto c = [](int k) { return k == 0 ? 1.0 : std::sqrt(2.0) * std::cos(k * std::numbers::pi / 16); };
+  auto c = [](int k) {
+    return k == 0 ? 1.0 : std::sqrt(2.0) * std::cos(k * std::numbers::pi / 16);
+  };
   uint16_t q[64];
   for (int i = 0; i < 64; ++i) q[i] = static_cast<uint16_t>(i == 9 ? 65535 : i + 1);
   uint32_t m[64];

@@ -185,7 +185,8 @@ TEST_P(Identify, TypeSizeAndImageCount) {
   EXPECT_TRUE(p.type == KOLVAVETA_IMAGE_JPEG || p.jpeg_offset == 0);
 }
 
-// A GIF header and one image(); that and the start of a second image.
+// A GIF header and one image(); that and the start of a second image (whose
+// sub-blocks of 200 bytes take 201 each).
 constexpr size_t kOne = 13 + 34, kTwo = kOne + 11;
 
 const IdentifyCase kIdentifyCases[] = {
@@ -220,12 +221,12 @@ const IdentifyCase kIdentifyCases[] = {
     // Without a trailer the count stands when the whole input was read, and
     // when the input ends between blocks.
     {"gif_no_trailer", Gif(320, 200).image().image().b, 6, 320, 200, 2, 0},
-    {"gif_cut_between_sub_blocks", cut(Gif(320, 200).image().image(0, 3, 200).b, kTwo + 2 * 201), 6, 320,
-     200, 2, 0},
+    {"gif_cut_between_sub_blocks", cut(Gif(320, 200).image().image(0, 3, 200).b, kTwo + 402), 6,
+     320, 200, 2, 0},
     {"gif_cut_in_descriptor", cut(Gif(320, 200).image().image().b, kOne + 5), 4, 320, 200, 1, 0},
     // Tables and sub-blocks that claim more than the input holds.
-    {"gif_cut_in_sub_block", cut(Gif(320, 200).image().image(0, 3, 200).b, kTwo + 2 * 201 + 50), 0, 320, 200, 2,
-     0},
+    {"gif_cut_in_sub_block", cut(Gif(320, 200).image().image(0, 3, 200).b, kTwo + 452), 0, 320,
+     200, 2, 0},
     {"gif_global_table_past_end", cut(Gif(320, 200, 0x87).b, 713), 0, 320, 200, 0, 0},
     {"gif_local_table_past_end",
      Gif(320, 200).image().raw({0x2C, 0, 0, 0, 0, 1, 0, 1, 0, 0x87, 1, 2, 3}).b, 0, 320, 200, 1,
@@ -423,7 +424,7 @@ TEST_P(WrappedJpeg, DecodesAsThePlainFile) {
 }
 
 INSTANTIATE_TEST_SUITE_P(ImageType, WrappedJpeg, ::testing::ValuesIn(kAllKinds),
-                         [](const auto& p) { return std::string(vjtest::input_kind_name(p.param)); });
+                         [](const auto& p) { return vjtest::input_kind_name(p.param); });
 
 // A caller's stream without a rewind callback cannot reach the embedded
 // stream by seeking: the decode refuses instead of reading from elsewhere

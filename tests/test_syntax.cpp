@@ -312,7 +312,8 @@ Bytes exif(bool big, const std::vector<IfdEntry>& ifd1, uint32_t ifd0_at = 8, si
     for (int i = 0; i < n; ++i) t.push_back(uint8_t(x >> (8 * (big ? n - 1 - i : i))));
   };
   auto entry = [&](const IfdEntry& e) {
-    const int n = e.type == 3 || e.type == 8 ? 2 : (e.type < 3 || e.type == 6 || e.type == 7) ? 1 : 4;
+    const bool byte = e.type == 1 || e.type == 2 || e.type == 6 || e.type == 7;
+    const int n = e.type == 3 || e.type == 8 ? 2 : byte ? 1 : 4;
     put(e.tag, 2), put(e.type, 2), put(1, 4), put(e.value, n), put(0, 4 - n);
   };
   put(42, 2), put(ifd0_at == 8 ? uint32_t(8 + padding) : ifd0_at, 4);
@@ -533,7 +534,8 @@ TEST_P(CorpusMarkers, PreScanFindsTheSizeAndThumbnail) {
 #endif
 }
 
-INSTANTIATE_TEST_SUITE_P(Fixtures, CorpusMarkers, ::testing::ValuesIn(vjtest::list_fixtures(".jpg")),
+INSTANTIATE_TEST_SUITE_P(Fixtures, CorpusMarkers,
+                         ::testing::ValuesIn(vjtest::list_fixtures(".jpg")),
                          [](const auto& p) { return vjtest::fixture_test_name(p.param); });
 
 // Truncated copies of every fixture: the marker reader and the pre-scan
