@@ -131,37 +131,23 @@ Bytes jpeg(const std::vector<Bytes>& segments, uint16_t width = 64, uint16_t hei
 }
 const Bytes kJfif = segment(0xE0, {'J', 'F', 'I', 'F', 0, 1, 1, 0, 0, 1, 0, 1, 0, 0});
 
-// A block using every reader: IFD0, Exif and GPS sub-IFDs, and a JPEG
-// thumbnail of 160x120 in IFD1.
+// A block using every way of storing a field, in IFD0, the Exif and GPS
+// sub-IFDs, and a JPEG thumbnail of 160x120 in IFD1.
 Bytes full_block(bool le, Bytes* thumbnail = nullptr, size_t software_size = 6) {
   TiffBuilder t(le);
   const int exif = t.ifd(), gps = t.ifd(), ifd1 = t.ifd();
   const Bytes thumb = jpeg({}, 160, 120);
   if (thumbnail != nullptr) *thumbnail = thumb;
   const int tb = t.blob(thumb);
-  t.num(0, 258, 3, {8, 8, 8}).num(0, 259, 3, {6}).str(0, 271, std::string("Abc", 4));
-  t.str(0, 272, std::string("Model-X 100", 12)).num(0, 274, 3, {6}).num(0, 282, 5, {72, 1});
-  t.num(0, 283, 5, {300, 2}).num(0, 296, 3, {2}).str(0, 305, std::string(software_size, 'v'));
-  t.num(0, 531, 3, {1}).str(0, 33432, "(c) nobody").ref(0, 34665, exif).ref(0, 34853, gps);
-  t.num(exif, 33434, 5, {1, 250}).num(exif, 33437, 5, {28, 10}).num(exif, 34855, 3, {200});
-  t.str(exif, 36864, "0230", 7).str(exif, 36867, std::string("2020:01:02 03:04:05", 20));
-  t.str(exif, 36868, std::string("2021:01:02 03:04:05", 20))
-      .num(exif, 37377, 10, {uint32_t(-7), 3});
-  t.num(exif, 37380, 10, {uint32_t(-1), 3}).num(exif, 37385, 3, {16}).num(exif, 37386, 5, {43, 10});
-  t.num(exif, 40961, 3, {1}).num(exif, 40962, 3, {640}).num(exif, 40963, 4, {480});
-  t.num(exif, 41986, 3, {1}).num(exif, 41987, 3, {2}).num(exif, 41988, 5, {3, 2});
-  t.str(gps, 0, std::string("\2\2\0\0", 4), 1).str(gps, 1, std::string("N", 2));
-  t.num(gps, 2, 5, {48, 1, 51, 1, 2400, 100}).str(gps, 3, std::string("E", 2));
-  t.num(gps, 4, 5, {2, 1, 21, 1, 300, 100}).str(gps, 5, std::string("\1", 1), 1);
-  t.num(gps, 6, 5, {350, 10})
-      .num(gps, 7, 5, {12, 1, 30, 1, 15, 1})
-      .str(gps, 18, std::string("WGS-84", 7));
-  t.str(gps, 27, std::string("ASCII\0\0\0GPS", 11), 7).str(gps, 29, "2020:01:02X");
-  t.ifds[0].next = ifd1;
-  t.num(ifd1, 256, 3, {999})
-      .num(ifd1, 257, 3, {999})
-      .num(ifd1, 259, 3, {6})
-      .num(ifd1, 282, 5, {72, 1});
+  t.str(0, 271, std::string("Abc", 4)).str(0, 272, std::string("Model-X 100", 12));
+  t.num(0, 274, 3, {6}).num(0, 283, 5, {300, 2}).str(0, 305, std::string(software_size, 'v'));
+  t.ref(0, 34665, exif).ref(0, 34853, gps).ifds[0].next = ifd1;
+  t.num(exif, 40962, 3, {640}).num(exif, 40963, 4, {480}).num(exif, 37380, 10, {uint32_t(-1), 3});
+  t.str(exif, 36864, "0230", 7).str(exif, 36868, std::string("2021:01:02 03:04:05", 20));
+  t.str(gps, 0, std::string("\2\2\0\0", 4), 1).num(gps, 2, 5, {48, 1, 51, 1, 2400, 100});
+  t.str(gps, 18, std::string("WGS-84", 7)).str(gps, 27, std::string("ASCII\0\0\0GPS", 11), 7);
+  t.str(gps, 3, std::string("E", 2)).str(gps, 29, "2020:01:02X");
+  t.num(ifd1, 256, 3, {999}).num(ifd1, 257, 3, {999}).num(ifd1, 259, 3, {6});
   t.num(ifd1, 283, 5, {96, 1}).ref(ifd1, 513, tb, true).num(ifd1, 514, 4, {uint32_t(thumb.size())});
   return t.build();
 }
@@ -170,39 +156,30 @@ class ByteOrder : public ::testing::TestWithParam<bool> {};
 INSTANTIATE_TEST_SUITE_P(Exif, ByteOrder, ::testing::Bool(),
                          [](const auto& p) { return p.param ? "Intel" : "Motorola"; });
 
-TEST_P(ByteOrder, EveryFieldOfEveryIfdIsRead) {
+TEST_P(ByteOrder, EveryKindOfFieldInEveryIfdIsRead) {
   int32_t result = 0;
   Bytes thumb;
   const Bytes tiff = full_block(GetParam(), &thumb);
   ExifPtr e = read_exif(tiff, 30, &result);
   ASSERT_EQ(result, 1);
-  EXPECT_EQ(e->bits_per_sample[2], 8u);
   EXPECT_STREQ(e->make, "Abc");  // inline in its entry
   EXPECT_STREQ(e->model, "Model-X 100");
-  EXPECT_EQ(e->orientation, 6u);
-  EXPECT_EQ(e->y_resolution[0], 300u);
-  EXPECT_EQ(e->y_resolution[1], 2u);
   EXPECT_STREQ(e->software, "vvvvvv");  // no NUL in the data: terminated in the copy
-  EXPECT_STREQ(e->rights_notice, "(c) nobody");
-  EXPECT_EQ(0, std::memcmp(e->exif_version, "0230", 4));
+  EXPECT_EQ(e->orientation, 6u);
+  EXPECT_EQ(e->y_resolution[1], 2u);
+  EXPECT_EQ(0, std::memcmp(e->exif_version, "0230", 5));
   EXPECT_STREQ(e->date_time_digitized, "2021:01:02 03:04:05");
   EXPECT_EQ(e->pixel_x_dimension, 640u);  // SHORT
   EXPECT_EQ(e->pixel_y_dimension, 480u);  // LONG
-  EXPECT_EQ(e->white_balance, 2u);
-  EXPECT_EQ(e->focal_length[0], 43u);
-  EXPECT_EQ(e->iso_speed_ratings, 200u);
   EXPECT_EQ(e->exposure_bias_value[0], -1);
-  EXPECT_EQ(e->shutter_speed_value[1], 3);
   ASSERT_NE(e->gps, nullptr);
   const GpsInfo& g = *e->gps;
   EXPECT_EQ(g.version_id[1], 2);
   EXPECT_STREQ(g.longitude_ref, "E");
   EXPECT_EQ(g.latitude[4], 2400u);
-  EXPECT_EQ(g.altitude_ref, 1);
-  EXPECT_EQ(g.time_stamp[4], 15u);
   EXPECT_STREQ(g.map_datum, "WGS-84");
   ASSERT_EQ(g.processing_method_length, 11u);
-  EXPECT_EQ(0, std::memcmp(g.processing_method, "ASCII\0\0\0GPS", 11));
+  EXPECT_EQ(0, std::memcmp(g.processing_method, "ASCII\0\0\0GPS", 12));
   EXPECT_STREQ(g.date_stamp, "2020:01:02");  // the 11th byte is always cleared
   const ThumbnailInfo& th = e->thumbnail;
   EXPECT_EQ(th.present, 1);
@@ -278,51 +255,52 @@ TEST_P(ByteOrder, StripThumbnailAndUnreadableJpegThumbnail) {
   EXPECT_EQ(f->thumbnail.format, kThumbJpeg);
 }
 
-// An entry at position 4 of a 40-byte block: type, count, value field.
-struct FieldCase {
-  uint16_t type;
-  uint32_t count;
-  uint32_t value_field;
-  uint32_t length;
-  bool usable;
-  uint32_t value;
-};
-class Field : public ::testing::TestWithParam<FieldCase> {};
-TEST_P(Field, TypeAndCountDecideWhereTheValueIs) {
-  const FieldCase& c = GetParam();
-  for (bool le : {true, false}) {
-    TiffBuilder w(le);
-    Bytes d(4, 0);
-    w.put(d, 0x1234, 2), w.put(d, c.type, 2), w.put(d, c.count, 4);
-    const bool short_inline = (c.type == 3 || c.type == 8) && c.count == 1;
-    w.put(d, c.value_field, short_inline ? 2 : 4);
-    d.resize(c.length, 0xEE);
-    ExifField f{};
-    ASSERT_EQ(VETAJ_ReadExifField(d.data(), 4, c.length, le, &f), c.usable ? 1 : 0);
-    if (!c.usable) continue;
-    EXPECT_EQ(f.tag, 0x1234);
-    EXPECT_EQ(f.count, c.count);
-    EXPECT_EQ(f.value, c.value);
+// An entry at position 4 of a block of `length` bytes: type, count and value
+// field decide whether the entry is usable and where its value is.
+TEST(Exif, TypeAndCountDecideWhereTheValueIs) {
+  struct Case {
+    uint16_t type;
+    uint32_t count, value_field, length;
+    bool usable;
+    uint32_t value;
+  } cases[] = {
+      {1, 4, 0, 40, true, 12},              // bytes in the entry
+      {2, 5, 35, 40, true, 35},             // ends at the data end
+      {2, 5, 36, 40, false, 0},             // one byte past it
+      {7, 0, 0, 40, false, 0},              // no values
+      {3, 1, 0xBEEF, 40, true, 0xBEEF},     // inline SHORT
+      {8, 1, 7, 40, true, 7},               // inline SSHORT
+      {3, 2, 16, 40, false, 0},             // two SHORTs: never
+      {3, 3, 34, 40, true, 34},             // 6 bytes
+      {3, 3, 35, 40, false, 0},
+      {4, 1, 0xDEADBEEF, 40, true, 0xDEADBEEF},
+      {11, 1, 5, 40, true, 5},              // FLOAT
+      {4, 2, 32, 40, true, 32},             // 8 bytes
+      {5, 1, 32, 40, true, 32},             // RATIONAL: 8 bytes
+      {12, 1, 33, 40, false, 0},            // DOUBLE: 8 bytes, one past the end
+      {5, 0x20000000, 16, 40, false, 0},    // 8 x count wraps to 0
+      {4, 0x40000001, 12, 40, false, 0},    // 4 x count wraps to 4
+      {2, 10, 0xFFFFFFF8, 40, false, 0},    // offset + count wraps
+      {0, 1, 0, 40, false, 0},              // unknown types
+      {13, 1, 8, 40, false, 0},
+      {1, 1, 0, 15, false, 0},              // entry past the data
+  };
+  for (const Case& c : cases) {
+    for (bool le : {true, false}) {
+      TiffBuilder w(le);
+      Bytes d(4, 0);
+      w.put(d, 0x1234, 2), w.put(d, c.type, 2), w.put(d, c.count, 4);
+      w.put(d, c.value_field, (c.type == 3 || c.type == 8) && c.count == 1 ? 2 : 4);
+      d.resize(c.length, 0xEE);
+      ExifField f{};
+      ASSERT_EQ(VETAJ_ReadExifField(d.data(), 4, c.length, le, &f), c.usable ? 1 : 0)
+          << c.type << " x " << c.count << " at " << c.value_field;
+      if (!c.usable) continue;
+      EXPECT_EQ(std::make_tuple(f.tag, f.count, f.value),
+                std::make_tuple(uint16_t(0x1234), c.count, c.value));
+    }
   }
 }
-INSTANTIATE_TEST_SUITE_P(
-    Exif, Field,
-    ::testing::Values(FieldCase{1, 4, 0, 40, true, 12},   // bytes in the entry
-                      FieldCase{2, 5, 35, 40, true, 35},  // ends at the data end
-                      FieldCase{2, 5, 36, 40, false, 0},
-                      FieldCase{7, 0, 0, 40, false, 0},           // no values
-                      FieldCase{3, 1, 0xBEEF, 40, true, 0xBEEF},  // inline SHORT
-                      FieldCase{8, 1, 7, 40, true, 7},
-                      FieldCase{3, 2, 16, 40, false, 0},  // two SHORTs: never
-                      FieldCase{3, 3, 34, 40, true, 34}, FieldCase{3, 3, 35, 40, false, 0},
-                      FieldCase{4, 1, 0xDEADBEEF, 40, true, 0xDEADBEEF},
-                      FieldCase{11, 1, 5, 40, true, 5}, FieldCase{4, 2, 32, 40, true, 32},
-                      FieldCase{5, 1, 32, 40, true, 32}, FieldCase{12, 1, 33, 40, false, 0},
-                      FieldCase{5, 0x20000000, 16, 40, false, 0},  // 8 x count wraps to 0
-                      FieldCase{4, 0x40000001, 12, 40, false, 0},  // 4 x count wraps to 4
-                      FieldCase{2, 10, 0xFFFFFFF8, 40, false, 0},  // offset + count wraps
-                      FieldCase{0, 1, 0, 40, false, 0}, FieldCase{13, 1, 8, 40, false, 0},
-                      FieldCase{1, 1, 0, 15, false, 0}));  // entry past the data
 
 TEST(Exif, HeaderChecksAndHostileStructures) {
   const Bytes ok = TiffBuilder(true).build();
@@ -516,44 +494,34 @@ TEST(Exif, ContainerHeaderAndBoundsChecks) {
   EXPECT_EQ(read_container(b), std::make_pair(1, loop.blob_at[0]));
 }
 
-struct ResolutionCase {
-  const char* name;
-  Bytes data;
-  int32_t status, width, height;
-};
-class Resolution : public ::testing::TestWithParam<ResolutionCase> {};
-TEST_P(Resolution, FrameSizeOfAnEmbeddedStream) {
-  const ResolutionCase& c = GetParam();
-  Bytes exact = c.data;
-  int32_t w = -1, h = -1;
-  EXPECT_EQ(VETAJ_GetJPEGResolution(exact.data(), uint32_t(exact.size()), &w, &h), c.status);
-  if (c.status == 200) {
+Bytes cut(Bytes b, size_t n) { return Bytes(b.begin(), b.begin() + n); }
+
+// The frame size of an embedded stream, or 201 (sizes left alone).
+TEST(Exif, ResolutionOfAnEmbeddedStream) {
+  constexpr size_t kFrame = 2 + 69 + 2;  // first byte after the SOF code in jpeg({})
+  Bytes precision12 = jpeg({});
+  precision12[kFrame + 2] = 12;
+  struct Case {
+    Bytes data;
+    int32_t width, height;  // 0: refused with 201
+  } cases[] = {
+      {jpeg({}, 300, 200), 300, 200},
+      {jpeg({kJfif, segment(0xFE, {0xFF, 0xC0})}, 7, 9, 0xC2), 7, 9},
+      {jpeg({{0xFF, 0xFF, 0xFF}}, 5, 6), 5, 6},
+      {{0xFF, 0xD9, 0xFF, 0xD8}, 0, 0},
+      {{0xFF, 0xD8, 0xFF, 0xDA, 0, 2}, 0, 0},
+      {precision12, 0, 0},
+      {{0xFF, 0xD8, 0xFF, 0xE0, 0x10, 0x00, 0, 0}, 0, 0},  // segment past the end
+      {cut(jpeg({}), kFrame + 16), 0, 0},                   // short frame
+      {cut(jpeg({}), kFrame + 11), 0, 0},                   // no scan
+  };
+  for (Case& c : cases) {
+    int32_t w = 0, h = 0;
+    EXPECT_EQ(VETAJ_GetJPEGResolution(c.data.data(), uint32_t(c.data.size()), &w, &h),
+              c.width == 0 ? 201 : 200);
     EXPECT_EQ(std::make_pair(w, h), std::make_pair(c.width, c.height));
   }
 }
-Bytes cut(Bytes b, size_t n) { return Bytes(b.begin(), b.begin() + n); }
-constexpr size_t kFrame = 2 + 69 + 2;  // first byte after the SOF code in jpeg({})
-INSTANTIATE_TEST_SUITE_P(
-    Exif, Resolution,
-    ::testing::Values(
-        ResolutionCase{"Baseline", jpeg({}, 300, 200), 200, 300, 200},
-        ResolutionCase{"Progressive", jpeg({kJfif, segment(0xFE, {0xFF, 0xC0})}, 7, 9, 0xC2), 200,
-                       7, 9},
-        ResolutionCase{"FillBytes", jpeg({{0xFF, 0xFF, 0xFF}}, 5, 6), 200, 5, 6},
-        ResolutionCase{"NoSoi", Bytes{0xFF, 0xD9, 0xFF, 0xD8}, 201, 0, 0},
-        ResolutionCase{"ScanWithoutFrame", Bytes{0xFF, 0xD8, 0xFF, 0xDA, 0, 2}, 201, 0, 0},
-        ResolutionCase{"Precision12",
-                       [] {
-                         Bytes b = jpeg({});
-                         b[kFrame + 2] = 12;
-                         return b;
-                       }(),
-                       201, 0, 0},
-        ResolutionCase{"SegmentPastTheEnd", Bytes{0xFF, 0xD8, 0xFF, 0xE0, 0x10, 0x00, 0, 0}, 201, 0,
-                       0},
-        ResolutionCase{"ShortFrame", cut(jpeg({}), kFrame + 16), 201, 0, 0},
-        ResolutionCase{"NoScan", cut(jpeg({}), kFrame + 11), 201, 0, 0}),
-    [](const auto& p) { return std::string(p.param.name); });
 
 // Truncation at every length and random byte flips (fixed seed) must never
 // read outside the data; the sanitizer build checks it.

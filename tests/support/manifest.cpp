@@ -9,21 +9,6 @@
 
 namespace vjtest {
 
-int ManifestEntry::marker_count(const std::string& marker) const {
-  auto it = fields.find("markers");
-  if (it == fields.end()) return 0;
-  std::istringstream list(it->second);
-  std::string item;
-  int count = 0;
-  while (std::getline(list, item, ',')) {
-    const size_t star = item.find('*');
-    const std::string name = item.substr(0, star);
-    if (name != marker) continue;
-    count += star == std::string::npos ? 1 : std::atoi(item.c_str() + star + 1);
-  }
-  return count;
-}
-
 long ManifestEntry::number(const std::string& key, long fallback) const {
   auto it = fields.find(key);
   return it == fields.end() ? fallback : std::strtol(it->second.c_str(), nullptr, 10);

@@ -11,9 +11,6 @@ namespace vjtest {
 struct ManifestEntry {
   size_t size = 0;
   std::map<std::string, std::string> fields;  // the key=value words of the line
-  // Number of segments of a marker listed in markers= (e.g. "SOS", "DHT",
-  // "APP0:JFXX"): "DHT*4" counts 4, "DHT" counts 1.
-  int marker_count(const std::string& marker) const;
   // A numeric field, or `fallback` when it is absent.
   long number(const std::string& key, long fallback = 0) const;
 };

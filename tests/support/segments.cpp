@@ -137,8 +137,8 @@ std::vector<size_t> cut_lengths(size_t size, size_t dense, size_t spread) {
 
 int32_t CallbackSource::read(void* self, void* buffer, uint32_t count) {
   auto* s = static_cast<CallbackSource*>(self);
-  const uint32_t size = static_cast<uint32_t>(s->data.size());
-  const uint32_t n = s->pos >= size ? 0 : (count < size - s->pos ? count : size - s->pos);
+  const size_t left = s->pos < s->data.size() ? s->data.size() - s->pos : 0;
+  const uint32_t n = static_cast<uint32_t>(count < left ? count : left);
   if (n > 0) std::memcpy(buffer, s->data.data() + s->pos, n);
   s->pos += n;
   return static_cast<int32_t>(n);
@@ -156,14 +156,8 @@ int32_t CallbackSource::rewind(void* self, void*, uint32_t) {
 }
 
 const char* input_kind_name(InputKind kind) {
-  switch (kind) {
-    case InputKind::kPath: return "path";
-    case InputKind::kHandle: return "handle";
-    case InputKind::kMemory: return "memory";
-    case InputKind::kOwnedMemory: return "owned_memory";
-    case InputKind::kStream: return "stream";
-  }
-  return "?";
+  static const char* const kNames[] = {"path", "handle", "memory", "owned_memory", "stream"};
+  return kNames[static_cast<int>(kind)];
 }
 
 InputHolder::InputHolder(InputKind kind, const Bytes& bytes, int32_t output_format)
