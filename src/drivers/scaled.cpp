@@ -118,12 +118,18 @@ struct InstalledSlots {  // the decoder's table, indexed by min(last, 28)
 struct ReducedSlots {  // the reduced table, indexed by min(last, 6)
   const DecoderInfo* d;
   VETAJ_IdctFn operator()(int32_t last) const {
-    return d->idct_slots[VETAJ_GetDctMethodIndex(last)];
+    const VETAJ_IdctFn f = d->idct_slots[vj_reduced_slot(last)];
+    return f == VETAJ_DoIdct_2x2 && last <= 4 ? vj_idct_2x2_low : f;
   }
 };
-template <VETAJ_IdctFn kRoutine>  // one routine for every block
-struct FixedRoutine {
-  VETAJ_IdctFn operator()(int32_t) const { return kRoutine; }
+struct DcSample {  // the 1x1 transform for every block, inlined
+  struct Call {
+    void operator()(const uint8_t* centre, const uint32_t* mult, const int16_t* coef,
+                    uint8_t** rows, uint32_t col) const {
+      vj_idct_1x1(centre, mult, coef, rows, col);
+    }
+  };
+  Call operator()(int32_t) const { return {}; }
 };
 struct Selectors {  // index and method functions given by the caller
   DecoderInfo* d;
@@ -193,7 +199,7 @@ int32_t VETAJ_DecodeSingleiMcuResize4to1(DecoderInfo* d, uint8_t*** rows) {
 }
 
 int32_t VETAJ_DecodeSingleiMcuResize8to1(DecoderInfo* d, uint8_t*** rows) {
-  return decode_rows(d, rows, VETAJ_DecodeMcu_8to1, FixedRoutine<VETAJ_DoIdct_1x1>{}, 1);
+  return decode_rows(d, rows, VETAJ_DecodeMcu_8to1, DcSample{}, 1);
 }
 
 int32_t VETAJ_DecompressOnepass(DecoderInfo* d, uint8_t*** rows) {
@@ -201,7 +207,7 @@ int32_t VETAJ_DecompressOnepass(DecoderInfo* d, uint8_t*** rows) {
     case 1: return decode_rows(d, rows, d->decode_mcu_reduced, ReducedSlots{d}, 4);
     case 2: return decode_rows(d, rows, d->decode_mcu_reduced, ReducedSlots{d}, 2);
     default:
-      return decode_rows(d, rows, d->decode_mcu_reduced, FixedRoutine<VETAJ_DoIdct_1x1>{}, 1);
+      return decode_rows(d, rows, d->decode_mcu_reduced, DcSample{}, 1);
   }
 }
 

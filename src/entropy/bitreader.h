@@ -250,6 +250,17 @@ struct FastFetch {
   // byte that came from one is recognised by its two raw bytes.
   template <class R>
   static void normalize(R& r) {
+    if (r.bits <= 32) return;
+    const int32_t n = (r.bits - 25) >> 3;  // bytes to hand back
+    // Without a 0xFF among them or just before them, every byte handed back
+    // is one raw byte: all go back at once.
+    if (r.cur - n - 1 >= r.start && std::memchr(r.cur - n - 1, 0xFF, static_cast<size_t>(n) + 1) == nullptr) {
+      r.cur -= n;
+      r.avail += static_cast<uint32_t>(n);
+      r.buf >>= 8 * n;
+      r.bits -= 8 * n;
+      return;
+    }
     while (r.bits > 32) {
       const bool stuffed = r.cur - 2 >= r.start && r.cur[-1] == 0x00 && r.cur[-2] == 0xFF;
       const uint32_t back = stuffed ? 2 : 1;

@@ -77,8 +77,8 @@ bool build_derived(DerivedHuffTable* t, const HuffTable* src) {
 // Skip entries over a window of kBits bits: every symbol whose code lies
 // wholly inside the window, with its magnitude bits (which may run past
 // it), until an end of block or more than 63 positions.
-template <int kBits>
-void build_skip_entries(uint32_t* out, const DerivedHuffTable* t) {
+template <int kBits, int kAdvanceShift, class Entry>
+void build_skip_entries(Entry* out, const DerivedHuffTable* t) {
   constexpr uint32_t kMask = (1u << kBits) - 1;
   for (uint32_t v = 0; v <= kMask; ++v) {
     uint32_t bits = 0;
@@ -101,16 +101,17 @@ void build_skip_entries(uint32_t* out, const DerivedHuffTable* t) {
       }
       if (advance > 63) break;
     }
-    out[v] = advance == 0 ? 0 : (bits | (advance << 16));
+    out[v] = static_cast<Entry>(advance == 0 ? 0 : (bits | (advance << kAdvanceShift)));
   }
 }
 
 void build_skip_table(AcSkipTable* skip, const DerivedHuffTable* t) {
-  build_skip_entries<8>(skip->entry, t);
+  build_skip_entries<8, 16>(skip->entry, t);
 }
 
 // Whole-coefficient entries: a code of at most 8 bits followed by its
-// magnitude bits, within the window.
+// magnitude bits, within the window; an end of block or a run of 16 zeros
+// gives value 0.
 void build_fast_coefficients(int32_t* out, const DerivedHuffTable* t) {
   constexpr uint32_t kMask = (1u << kFastCoefBits) - 1;
   for (uint32_t v = 0; v <= kMask; ++v) {
@@ -119,7 +120,11 @@ void build_fast_coefficients(int32_t* out, const DerivedHuffTable* t) {
     const uint32_t len = e >> 8;
     const uint32_t r = (e >> 4) & 15;
     const uint32_t s = e & 15;
-    if (len > 8 || s == 0 || len + s > kFastCoefBits) continue;
+    if (len > 8 || len + s > kFastCoefBits) continue;
+    if (s == 0) {  // end of block or run of 16 zeros: value 0
+      out[v] = static_cast<int32_t>((r << 8) | len);
+      continue;
+    }
     const uint32_t mag = (v >> (kFastCoefBits - len - s)) & ((1u << s) - 1);
     int32_t value = static_cast<int32_t>(mag);
     if (value < VETAJ_HUFF_EXTEND_TEST[s]) value += static_cast<int32_t>(1u - (1u << s));
@@ -154,7 +159,7 @@ int32_t prepare(DecoderInfo* d, int32_t is_dc, int32_t table_no, DerivedHuffTabl
     if (t->fast == nullptr) t->fast = vj::alloc_zeroed<AcFastTables>();
     if (t->fast == nullptr) return vj::kStatusFail;
     build_fast_coefficients(t->fast->coef, t);
-    build_skip_entries<kWideSkipBits>(t->fast->skip, t);
+    build_skip_entries<kWideSkipBits, kWideSkipAdvanceShift>(t->fast->skip, t);
   }
   if (is_dc) {
     uint32_t n = 0;

@@ -28,14 +28,18 @@ struct DerivedHuffTable {
 
 // Wider lookups of a baseline AC table, used where the window is known to
 // hold the bits:
-// - coef: next 10 bits -> one whole coefficient when its code and magnitude
-//   fit: (value << 16) | (run << 8) | bits taken; 0 otherwise;
-// - skip: next 12 bits -> as AcSkipTable, over a 12-bit window.
+// - coef: next 10 bits -> one whole symbol when its code and magnitude
+//   fit: (value << 16) | (run << 8) | bits taken, value 0 for an end of
+//   block (run below 15) or a run of 16 zeros (run 15); 0 otherwise;
+// - skip: next 13 bits -> the symbols of AcSkipTable over a 13-bit window,
+//   packed in 16 bits as bits | (advance << 6): the bit count sits in the
+//   low six bits so that it can be used directly as a shift count.
 constexpr int kFastCoefBits = 10;
-constexpr int kWideSkipBits = 12;
+constexpr int kWideSkipBits = 13;
+constexpr int kWideSkipAdvanceShift = 6;
 struct AcFastTables {
   int32_t coef[1 << kFastCoefBits];
-  uint32_t skip[1 << kWideSkipBits];
+  uint16_t skip[1 << kWideSkipBits];
 };
 
 // AC skip table: next 8 bits -> bits | (advance << 16). bits counts every

@@ -52,6 +52,10 @@ using vj::BitReader;
 using vj::CarefulFetch;
 using vj::FastFetch;
 
+// The skipping loops keep their bit state in registers only when inlined
+// into the block loop.
+#define VJ_ALWAYS_INLINE inline __attribute__((always_inline))
+
 // What a decoder keeps of each block.
 enum class Keep {
   kAll,   // decode and store coefficients up to a zig-zag limit
@@ -92,7 +96,13 @@ inline bool decode_block(R& r, const DerivedHuffTable* dct, const DerivedHuffTab
         const int32_t fe = fast[r.peek(kFastCoefBits)];
         if (fe != 0) {
           r.bits -= fe & 0xFF;
-          k += (fe >> 8) & 15;
+          const int32_t run = (fe >> 8) & 15;
+          if ((fe >> 16) == 0) {  // end of block, or 16 zeros
+            if (run != 15) break;
+            k += 15;
+            continue;
+          }
+          k += run;
           if (kLastStored == 63 || k <= kLastStored) {
             blk[VETAJ_NATURAL_ORDER[k]] = static_cast<int16_t>(fe >> 16);
             last = k;
@@ -136,23 +146,34 @@ inline bool decode_block(R& r, const DerivedHuffTable* dct, const DerivedHuffTab
 // What one skip-table lookup means at block position k.
 enum class SkipStep { kGoOn, kEnds, kByHand };
 
+// Fields of a skip entry; advance 0 means no complete code in the window.
+struct SkipEntry {
+  int32_t advance;
+  int32_t nbits;
+};
+inline SkipEntry narrow_entry(uint32_t e) {
+  return {static_cast<int32_t>(e >> 16), static_cast<int32_t>(e & 0xFFFF)};
+}
+inline SkipEntry wide_entry(uint32_t e) {
+  return {static_cast<int32_t>(e >> kWideSkipAdvanceShift), static_cast<int32_t>(e & 63)};
+}
+
 // The common case takes the lookup's symbols and the block goes on; the
 // block can also end inside the lookup (an end of block, or exactly at
 // position 63); otherwise the lookup runs past the block or holds no
 // complete code, and the next symbol is taken by hand.
 template <class R>
-inline SkipStep take_lookup(R& r, uint32_t entry, int32_t* k) {
-  if (entry == 0) return SkipStep::kByHand;
-  const int32_t advance = static_cast<int32_t>(entry >> 16);
-  const int32_t nbits = static_cast<int32_t>(entry & 0xFFFF);
+inline SkipStep take_lookup(R& r, SkipEntry entry, int32_t* k) {
+  if (entry.advance == 0) return SkipStep::kByHand;
   const int32_t eob = static_cast<int32_t>(kSkipEob);
-  if (*k + advance < 64) {
-    r.bits -= nbits;  // may go negative: the next refill restores it
-    *k += advance;
+  if (*k + entry.advance < 64) {
+    r.bits -= entry.nbits;  // may go negative: the next refill restores it
+    *k += entry.advance;
     return SkipStep::kGoOn;
   }
-  if ((advance >= eob && *k + advance - eob < 64) || (advance < eob && *k + advance == 64)) {
-    r.bits -= nbits;
+  if ((entry.advance >= eob && *k + entry.advance - eob < 64) ||
+      (entry.advance < eob && *k + entry.advance == 64)) {
+    r.bits -= entry.nbits;
     return SkipStep::kEnds;
   }
   return SkipStep::kByHand;
@@ -177,38 +198,256 @@ inline bool skip_symbol(R& r, const DerivedHuffTable* act, int32_t* k, bool* ok)
   return true;
 }
 
+// Bit state of the skipping loops on 64-bit hosts. The next bits are held
+// left-aligned in a 64-bit word, so that one lookup is a shift right, a load
+// and a shift left by the entry's bit count: the shortest chain from one
+// group of symbols to the next. A refill keeps at least 56 bits, enough for
+// two skip lookups of at most 28 bits each or one DC difference. When the
+// window's next 8 bytes hold no 0xFF they are merged in whole (bits below
+// the valid ones are then the next bytes themselves, so merging them again
+// changes nothing); otherwise bytes are taken one at a time with the
+// stuffing and marker rules of FastFetch.
+struct LeftBits {
+  uint64_t left;
+  int32_t have;  // valid bits at the top of `left`
+  const uint8_t* cur;
+
+  template <class R>
+  void load(R& r) {
+    if (r.bits < 32) R::Fetch::fill(r);
+    left = static_cast<uint64_t>(r.buf) << (64 - r.bits);
+    have = r.bits;
+    cur = r.cur;
+  }
+  template <class R>
+  void store(R& r) const {
+    r.buf = have > 0 ? static_cast<typename R::Word>(left >> (64 - have)) : 0;
+    r.bits = have;
+    r.avail -= static_cast<uint32_t>(cur - r.cur);
+    r.cur = cur;
+  }
+  template <class R>
+  VJ_ALWAYS_INLINE void refill(R& r) {
+    uint64_t w;
+    std::memcpy(&w, cur, 8);
+    const uint64_t inv = ~w;  // a 0xFF byte becomes a zero byte
+    if (((inv - 0x0101010101010101ull) & ~inv & 0x8080808080808080ull) == 0) {
+      left |= __builtin_bswap64(w) >> have;
+      cur += (63 - have) >> 3;
+      have |= 56;
+      return;
+    }
+    while (have <= 56) {
+      uint64_t c = cur[0];
+      if (c == 0xFF) {
+        if (cur[1] == 0x00) {
+          cur += 2;
+        } else {
+          c = 0;  // a marker: zeros from here on, the cursor stays on it
+          r.marker_seen = true;
+        }
+      } else {
+        ++cur;
+      }
+      left |= c << (56 - have);
+      have += 8;
+    }
+  }
+  uint32_t peek(int n) const { return static_cast<uint32_t>(left >> (64 - n)); }
+  void drop(uint32_t n) {
+    left <<= n & 63;
+    have -= static_cast<int32_t>(n & 63);
+  }
+};
+
+// Steps over AC data from position *k with the 13-bit skip table. True when
+// the block ended; false when the next symbol must be taken by hand (a code
+// longer than 8 bits, or a lookup running past the block), with *k where
+// that symbol starts.
+template <class R>
+VJ_ALWAYS_INLINE bool skip_ac_left(LeftBits& lb, R& r, const uint16_t* wide, int32_t* k_io) {
+  int32_t k = *k_io;
+  uint32_t e;
+  int32_t advance;
+  for (;;) {
+    lb.refill(r);
+    e = wide[lb.peek(kWideSkipBits)];
+    advance = static_cast<int32_t>(e >> kWideSkipAdvanceShift);
+    if (e == 0 || k + advance > 63) break;
+    lb.drop(e);
+    k += advance;
+    e = wide[lb.peek(kWideSkipBits)];
+    advance = static_cast<int32_t>(e >> kWideSkipAdvanceShift);
+    if (e == 0 || k + advance > 63) break;
+    lb.drop(e);
+    k += advance;
+  }
+  *k_io = k;
+  const int32_t eob = static_cast<int32_t>(kSkipEob);
+  if (e != 0 && ((advance >= eob && k + advance - eob < 64) || k + advance == 64)) {
+    lb.drop(e);
+    return true;
+  }
+  return false;
+}
+
+// Skips the rest of a block from position k on left-aligned bits, taking
+// symbols by hand where the table cannot. False when the input ended.
+template <class R>
+VJ_ALWAYS_INLINE bool skip_rest_left(LeftBits& lb, R& r, const DerivedHuffTable* act, const uint16_t* wide,
+                           int32_t k) {
+  while (k < 64 && !skip_ac_left(lb, r, wide, &k)) {
+    lb.store(r);
+    bool ok = true;
+    const bool more = skip_symbol(r, act, &k, &ok);
+    lb.load(r);
+    if (!more) return ok;
+  }
+  return true;
+}
+
+// A magnitude of s bits taken from left-aligned bits, extended to its
+// signed value.
+VJ_ALWAYS_INLINE int32_t take_magnitude(LeftBits& lb, int32_t s) {
+  const int32_t v = static_cast<int32_t>(lb.peek(s));
+  lb.drop(static_cast<uint32_t>(s));
+  const int32_t negative = (v - VETAJ_HUFF_EXTEND_TEST[s]) >> 31;  // all ones or 0
+  return v + (negative & static_cast<int32_t>(1u - (1u << s)));
+}
+
+// One Huffman symbol from left-aligned bits through the 8-bit lookahead,
+// or by the bit-by-bit search for a longer code.
+template <class R>
+VJ_ALWAYS_INLINE int32_t symbol_left(LeftBits& lb, R& r, const DerivedHuffTable* t) {
+  const uint32_t e = t->lookahead[lb.peek(8)];
+  if ((e >> 8) <= 8) {
+    lb.drop(e >> 8);
+    return static_cast<int32_t>(e & 0xFF);
+  }
+  lb.store(r);
+  const int32_t sym = r.decode(t);
+  lb.load(r);
+  return sym;
+}
+
+// One block on left-aligned bits (64-bit fast policy; the AC table has its
+// wide tables): the DC difference, the coefficients up to zig-zag position
+// kLastStored (stored when kStore), then the rest of the block stepped over
+// with the skip table. False when the input ended.
+template <int kLastStored, bool kStore, class R>
+VJ_ALWAYS_INLINE bool block_left(LeftBits& lb, R& r, const DerivedHuffTable* dct,
+                                 const DerivedHuffTable* act, int16_t* blk, int32_t* pred,
+                                 int32_t* last_out) {
+  lb.refill(r);
+  const int32_t s0 = symbol_left(lb, r, dct);
+  if (s0 < 0) return false;
+  *pred += s0 != 0 ? take_magnitude(lb, s0 & 15) : 0;
+  if constexpr (kStore) blk[0] = static_cast<int16_t>(*pred);
+  int32_t last = 0;
+  int32_t k = 1;
+  if constexpr (kLastStored > 0) {
+    // Whole coefficients come from one lookup of the next 10 bits when their
+    // code and magnitude fit; other symbols are taken one by one.
+    const int32_t* fast = act->fast->coef;
+    for (; k < 64; ++k) {
+      lb.refill(r);
+      const int32_t fe = fast[lb.peek(kFastCoefBits)];
+      int32_t v;
+      if (fe != 0) {
+        lb.drop(static_cast<uint32_t>(fe & 0xFF));
+        const int32_t run = (fe >> 8) & 15;
+        v = fe >> 16;
+        if (v == 0) {  // end of block, or 16 zeros
+          if (run != 15) break;
+          k += 15;
+          continue;
+        }
+        k += run;
+      } else {
+        const int32_t rs = symbol_left(lb, r, act);
+        if (rs < 0) return false;
+        const int32_t run = rs >> 4;
+        const int32_t s = rs & 15;
+        if (s == 0) {
+          if (run != 15) break;  // end of block
+          k += 15;
+          continue;
+        }
+        k += run;
+        v = take_magnitude(lb, s);
+      }
+      if (kLastStored == 63 || k <= kLastStored) {
+        blk[VETAJ_NATURAL_ORDER[k]] = static_cast<int16_t>(v);
+        last = k;
+        continue;
+      }
+      ++k;  // past the kept range: the rest is skipped
+      *last_out = last;
+      return skip_rest_left(lb, r, act, act->fast->skip, k);
+    }
+    *last_out = last;
+    return true;
+  }
+  *last_out = last;
+  return skip_rest_left(lb, r, act, act->fast->skip, k);
+}
+
 // Steps over the AC data of one block with the skip table, several symbols
 // per lookup; ends exactly where a full decode of the block would.
 template <class R>
 inline bool skip_ac(R& r, const DerivedHuffTable* act, const AcSkipTable* skip, int32_t k) {
   bool ok = true;
-  // Where the window holds the bits, the 12-bit table of the same entries
+  // Where the window holds the bits, the 13-bit table of the same symbols
   // covers more symbols per lookup.
-  const uint32_t* wide = nullptr;
+  const uint16_t* wide = nullptr;
   if constexpr (R::kFast) {
     if (act->fast != nullptr) wide = act->fast->skip;
     if constexpr (sizeof(typename R::Word) == 8) {
-      // With 40 bits in hand two lookups are safe (one takes at most 27).
-      while (wide != nullptr && k < 64) {
-        if (r.bits < 40) R::Fetch::fill(r);
-        SkipStep step = take_lookup(r, wide[r.peek(kWideSkipBits)], &k);
-        if (step == SkipStep::kGoOn) step = take_lookup(r, wide[r.peek(kWideSkipBits)], &k);
-        if (step == SkipStep::kGoOn) continue;
-        if (step == SkipStep::kEnds || !skip_symbol(r, act, &k, &ok)) return ok;
+      if (wide != nullptr) {
+        LeftBits lb;
+        lb.load(r);
+        ok = skip_rest_left(lb, r, act, wide, k);
+        lb.store(r);
+        return ok;
       }
-      return true;
     }
   }
   while (k < 64) {
     r.prefetch8();
     if (r.bits >= 8) {
-      const SkipStep step = take_lookup(
-          r, wide != nullptr ? wide[r.peek(kWideSkipBits)] : skip->entry[r.peek(8)], &k);
+      const SkipStep step =
+          take_lookup(r,
+                      wide != nullptr ? wide_entry(wide[r.peek(kWideSkipBits)])
+                                      : narrow_entry(skip->entry[r.peek(8)]),
+                      &k);
       if (step == SkipStep::kGoOn) continue;
       if (step == SkipStep::kEnds) return true;
     }
     if (!skip_symbol(r, act, &k, &ok)) return ok;
   }
+  return true;
+}
+
+// The blocks of one MCU on left-aligned bits.
+template <int kLastStored, Keep kKeep, bool kDcCheck, class R>
+bool run_mcu_left(R& r, DecoderInfo* d, int16_t** blocks, int32_t* pred, bool* dc_bad) {
+  EntropyState* e = d->entropy;
+  const uint32_t nb = d->blocks_in_mcu;
+  LeftBits lb;
+  lb.load(r);
+  for (uint32_t b = 0; b < nb; ++b) {
+    int32_t* p = &pred[d->mcu_membership[b] & 3];
+    constexpr bool kStore = kKeep == Keep::kAll;
+    int32_t last;
+    if (!block_left<kStore ? kLastStored : 0, kStore>(lb, r, e->block_dc[b], e->block_ac[b],
+                                                       kStore ? blocks[b] : nullptr, p, &last))
+      return false;
+    if constexpr (kStore) d->last_nonzero[b] = last;
+    if constexpr (kDcCheck) {
+      if (*p < -2047 || *p > 2047) *dc_bad = true;
+    }
+  }
+  lb.store(r);
   return true;
 }
 
@@ -218,6 +457,19 @@ bool run_mcu(BitReader<Fetch>& r, DecoderInfo* d, int16_t** blocks, bool* dc_out
   EntropyState* e = d->entropy;
   int32_t pred[4] = {e->last_dc[0], e->last_dc[1], e->last_dc[2], e->last_dc[3]};
   const uint32_t nb = d->blocks_in_mcu;
+  if constexpr (Fetch::kFast && sizeof(typename Fetch::Word) == 8) {
+    bool wide = true;
+    for (uint32_t b = 0; b < nb; ++b) {
+      const DerivedHuffTable* act = e->block_ac[b];
+      wide = wide && e->block_dc[b] != nullptr && act != nullptr && act->fast != nullptr;
+    }
+    if (wide) {
+      if (!run_mcu_left<kLastStored, kKeep, kDcCheck>(r, d, blocks, pred, dc_out_of_range))
+        return false;
+      for (int i = 0; i < 4; ++i) e->last_dc[i] = pred[i];
+      return true;
+    }
+  }
   for (uint32_t b = 0; b < nb; ++b) {
     const DerivedHuffTable* dct = e->block_dc[b];
     const DerivedHuffTable* act = e->block_ac[b];

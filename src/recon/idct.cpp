@@ -140,8 +140,7 @@ extern "C" VETAJ_IdctFn VETAJ_GetDctMethod2to1(DecoderInfo*, int32_t) { return V
 extern "C" VETAJ_IdctFn VETAJ_GetDctMethod8to3(DecoderInfo*, int32_t) { return VETAJ_DoIdct_8to3; }
 
 extern "C" int32_t VETAJ_GetDctMethodIndex(int32_t last_index) {
-  if (last_index < 0) return 0;
-  return last_index < kIdctResizeSlots - 1 ? last_index : kIdctResizeSlots - 1;
+  return vj_reduced_slot(last_index);
 }
 
 int32_t VETAJ_GetDctMethodIndexFirst(int32_t) { return 0; }

@@ -29,10 +29,21 @@ using IdctRoutine = void(const uint8_t* centre, const uint32_t* multipliers,
 
 // 8x8 accurate integer transform.
 IdctRoutine VETAJ_DoIdct_islow;
+// The 1x1 transform: the DC value's sample, (DC x multiplier + 4) >> 3.
+// Inline for the 1/8 row driver, which calls it for every block.
+inline void vj_idct_1x1(const uint8_t* centre, const uint32_t* mult, const int16_t* coef,
+                        uint8_t** rows, uint32_t col) {
+  const uint32_t v = static_cast<uint32_t>(static_cast<int32_t>(coef[0])) * mult[0] + 4;
+  rows[0][col] = centre[(v >> 3) & 1023u];
+}
+
 // Square reductions: 1/2 (4x4), 1/4 (2x2), 1/8 (1x1).
 IdctRoutine VETAJ_DoIdct_4x4;
 IdctRoutine VETAJ_DoIdct_2x2;
 IdctRoutine VETAJ_DoIdct_1x1;
+// VETAJ_DoIdct_2x2 for a block whose coefficients end by zig-zag position
+// 4 (as the 1/4 decoder leaves them): the same output, reading less.
+IdctRoutine vj_idct_2x2_low;
 // Rectangular sizes of the per-component scaled mode.
 IdctRoutine VETAJ_DoIdct_8x4;
 IdctRoutine VETAJ_DoIdct_4x8;
@@ -87,6 +98,10 @@ VETAJ_IdctFn vj_idct_for_size(int32_t width, int32_t height);
 // VETAJ_GetDctMethodIndex, gives min(k, 6), and 0 for a negative k). This
 // one always gives 0: the paths that use it do not track k.
 int32_t VETAJ_GetDctMethodIndexFirst(int32_t last_index);
+inline int32_t vj_reduced_slot(int32_t last_index) {
+  if (last_index < 0) return 0;
+  return last_index < kIdctResizeSlots - 1 ? last_index : kIdctResizeSlots - 1;
+}
 
 // floor(log2 n) for n >= 1; -1 for n <= 0.
 int32_t VETAJ_LOGN(int32_t n);

@@ -100,13 +100,25 @@ void VETAJ_DoIdct_4x4(const uint8_t* centre, const uint32_t* mult, const int16_t
   }
 }
 
-void VETAJ_DoIdct_2x2(const uint8_t* centre, const uint32_t* mult, const int16_t* coef,
-                      uint8_t** rows, uint32_t col) {
+namespace {
+
+// The 2x2 transform reads columns and rows 0, 1, 3, 5 and 7. A block whose
+// coefficients end by zig-zag position 4 has nothing outside rows and
+// columns 0..2 (and row or column 2 is not read): kLow reads only the
+// first two rows and columns and takes the rest as zero.
+template <bool kLow>
+inline void idct_2x2(const uint8_t* centre, const uint32_t* mult, const int16_t* coef,
+                     uint8_t** rows, uint32_t col) {
   static constexpr int kUsed[5] = {0, 1, 3, 5, 7};
+  constexpr int kColumns = kLow ? 2 : 5;
   w32 ws[2][8] = {};  // columns 2, 4 and 6 are not used
-  for (int c : kUsed) {
-    auto d = [&](int r) { return dequant(coef[8 * r + c], mult[8 * r + c]); };
-    if ((coef[8 + c] | coef[24 + c] | coef[40 + c] | coef[56 + c]) == 0) {
+  for (int i = 0; i < kColumns; ++i) {
+    const int c = kUsed[i];
+    auto q = [&](int r) -> int32_t { return kLow && r > 1 ? 0 : coef[8 * r + c]; };
+    auto d = [&](int r) -> w32 {
+      return kLow && r > 1 ? 0 : dequant(coef[8 * r + c], mult[8 * r + c]);
+    };
+    if ((q(1) | q(3) | q(5) | q(7)) == 0) {
       ws[0][c] = ws[1][c] = d(0) << 2;
       continue;
     }
@@ -129,9 +141,21 @@ void VETAJ_DoIdct_2x2(const uint8_t* centre, const uint32_t* mult, const int16_t
   }
 }
 
+}  // namespace
+
+void VETAJ_DoIdct_2x2(const uint8_t* centre, const uint32_t* mult, const int16_t* coef,
+                      uint8_t** rows, uint32_t col) {
+  idct_2x2<false>(centre, mult, coef, rows, col);
+}
+
+void vj_idct_2x2_low(const uint8_t* centre, const uint32_t* mult, const int16_t* coef,
+                     uint8_t** rows, uint32_t col) {
+  idct_2x2<true>(centre, mult, coef, rows, col);
+}
+
 void VETAJ_DoIdct_1x1(const uint8_t* centre, const uint32_t* mult, const int16_t* coef,
                       uint8_t** rows, uint32_t col) {
-  rows[0][col] = sample(centre, dequant(coef[0], mult[0]) + 4, 3);
+  vj_idct_1x1(centre, mult, coef, rows, col);
 }
 
 // --- Rectangular sizes ---
