@@ -119,6 +119,7 @@ struct ReducedSlots {  // the reduced table, indexed by min(last, 6)
   const DecoderInfo* d;
   VETAJ_IdctFn operator()(int32_t last) const {
     const VETAJ_IdctFn f = d->idct_slots[vj_reduced_slot(last)];
+    if (f == VETAJ_DoIdct_4x4 && last <= 18) return vj_idct_4x4_low;
     return f == VETAJ_DoIdct_2x2 && last <= 4 ? vj_idct_2x2_low : f;
   }
 };
@@ -138,6 +139,16 @@ struct Selectors {  // index and method functions given by the caller
   VETAJ_IdctFn operator()(int32_t last) const { return method(d, index(last)); }
 };
 
+// Where one block of an MCU goes within an MCU row.
+struct BlockTarget {
+  const uint8_t* centre;
+  const uint32_t* mult;
+  uint8_t** rows;     // the component's first output row of the block
+  uint32_t x0;        // output column of the block in the MCU at column 0
+  uint32_t x_step;    // output columns per MCU
+  bool visible;       // inside the component's height (else only emptied)
+};
+
 // One iMCU row: decode each MCU with `decode`, transform each block into the
 // sample rows (blocks `block_step` samples apart), empty the blocks.
 template <class Transform>
@@ -146,10 +157,25 @@ int32_t decode_rows(DecoderInfo* d, uint8_t*** rows, McuDecodeFn decode, Transfo
   if (past_region(d)) return vj::kStatusEnd;
   const McuRowGeometry g = row_geometry(d);
   const bool skipping = above_region(d, g.mcu_px);
+  const uint32_t nb = d->blocks_in_mcu < 10 ? d->blocks_in_mcu : 10;
+  BlockTarget targets[10];
   for (uint32_t mr = d->imcu.mcu_row; mr < d->imcu.mcu_rows; ++mr) {
     const uint32_t scan_row =
         g.single ? d->imcu_row * d->scan_components[0]->v_samp + mr : d->imcu_row;
     const uint32_t top = d->imcu_row * g.mcu_px + (g.single ? mr * g.block_px : 0);
+    // The blocks' places are the same for every MCU of the row.
+    for_each_block(d, [&](uint32_t b, const BlockPlace& p) {
+      if (b >= nb) return;
+      const ComponentInfo* c = p.comp;
+      const uint32_t block_row_in_imcu = g.single ? mr : p.by;
+      const uint32_t mw = g.single ? 1 : c->mcu_width;
+      targets[b] = BlockTarget{centre_for(d, c),
+                               c->multipliers,
+                               rows[c->index] + block_row_in_imcu * block_step,
+                               p.bx * block_step,
+                               mw * block_step,
+                               d->imcu_row * c->v_samp + block_row_in_imcu < c->height_blocks};
+    });
     for (uint32_t col = d->imcu.first_col; col < d->mcus_per_row; ++col) {
       d->current_mcu_row = scan_row;
       d->current_mcu_col = col;
@@ -159,19 +185,13 @@ int32_t decode_rows(DecoderInfo* d, uint8_t*** rows, McuDecodeFn decode, Transfo
         return vj::kStatusCorrupt;
       }
       if (skipping) continue;
-      for_each_block(d, [&](uint32_t b, const BlockPlace& p) {
-        const ComponentInfo* c = p.comp;
-        const uint32_t block_row_in_imcu = g.single ? mr : p.by;
+      for (uint32_t b = 0; b < nb; ++b) {
+        const BlockTarget& t = targets[b];
         int16_t* blk = d->imcu.blocks[b];
         const int32_t last = d->last_nonzero[b];
-        if (d->imcu_row * c->v_samp + block_row_in_imcu < c->height_blocks) {
-          const uint32_t mw = g.single ? 1 : c->mcu_width;
-          transform(last)(centre_for(d, c), c->multipliers, blk,
-                          rows[c->index] + block_row_in_imcu * block_step,
-                          (col * mw + p.bx) * block_step);
-        }
+        if (t.visible) transform(last)(t.centre, t.mult, blk, t.rows, col * t.x_step + t.x0);
         clear_block(blk, last);
-      });
+      }
     }
     d->imcu.first_col = 0;
   }

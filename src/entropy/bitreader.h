@@ -254,7 +254,17 @@ struct FastFetch {
     const int32_t n = (r.bits - 25) >> 3;  // bytes to hand back
     // Without a 0xFF among them or just before them, every byte handed back
     // is one raw byte: all go back at once.
-    if (r.cur - n - 1 >= r.start && std::memchr(r.cur - n - 1, 0xFF, static_cast<size_t>(n) + 1) == nullptr) {
+    bool plain = r.cur - n - 1 >= r.start;
+    if (kWide && std::endian::native == std::endian::little && r.cur - 8 >= r.start) {
+      uint64_t w;  // the 8 bytes before the cursor, the last one on top
+      std::memcpy(&w, r.cur - 8, 8);
+      const uint64_t inv = ~w;  // a 0xFF byte becomes a zero byte
+      const uint64_t ff = (inv - 0x0101010101010101ull) & ~inv & 0x8080808080808080ull;
+      plain = (ff >> (8 * (7 - n))) == 0;
+    } else {
+      for (int32_t i = 1; plain && i <= n + 1; ++i) plain = r.cur[-i] != 0xFF;
+    }
+    if (plain) {
       r.cur -= n;
       r.avail += static_cast<uint32_t>(n);
       r.buf >>= 8 * n;

@@ -214,8 +214,8 @@ struct LeftBits {
 
   template <class R>
   void load(R& r) {
-    if (r.bits < 32) R::Fetch::fill(r);
-    left = static_cast<uint64_t>(r.buf) << (64 - r.bits);
+    if (r.bits < 0) R::Fetch::fill(r);  // bits owed from a skip lookup
+    left = r.bits > 0 ? static_cast<uint64_t>(r.buf) << (64 - r.bits) : 0;
     have = r.bits;
     cur = r.cur;
   }
@@ -534,7 +534,7 @@ int32_t decode_mcu(DecoderInfo* d, int16_t** blocks) {
   bool dc_bad = false;
   const uint32_t margin = vj::fast_margin(nb);
   if (d->unread_marker == 0 && !vj::g_entropy_careful_only &&
-      vj::entropy_top_up(d, margin) >= margin) {
+      (d->window->remaining >= margin || vj::entropy_top_up(d, margin) >= margin)) {
     const int32_t saved_dc[4] = {e->last_dc[0], e->last_dc[1], e->last_dc[2], e->last_dc[3]};
     BitReader<FastFetch> fast(d);
     if (run_mcu<kLastStored, kKeep, kDcCheck>(fast, d, blocks, &dc_bad) && !fast.marker_seen) {

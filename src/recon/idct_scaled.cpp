@@ -67,14 +67,24 @@ inline w32 odd2x2(w32 i1, w32 i3, w32 i5, w32 i7) {
 
 using namespace vj::idct;
 
-void VETAJ_DoIdct_4x4(const uint8_t* centre, const uint32_t* mult, const int16_t* coef,
-                      uint8_t** rows, uint32_t col) {
+namespace {
+
+// The 4x4 transform reads rows and columns 0..3 and 5..7. A block whose
+// coefficients end by zig-zag position 18 (as the 1/2 decoder leaves them)
+// has nothing in rows 5..7 or columns 6 and 7: kLow reads only the rest and
+// takes those as zero.
+template <bool kLow>
+inline void idct_4x4(const uint8_t* centre, const uint32_t* mult, const int16_t* coef,
+                     uint8_t** rows, uint32_t col) {
   w32 ws[4][8];  // column 4 is not used
-  for (int c = 0; c < 8; ++c) {
+  constexpr int kColumns = kLow ? 6 : 8;
+  for (int c = 0; c < kColumns; ++c) {
     if (c == 4) continue;
-    auto d = [&](int r) { return dequant(coef[8 * r + c], mult[8 * r + c]); };
-    if ((coef[8 + c] | coef[16 + c] | coef[24 + c] | coef[40 + c] | coef[48 + c] | coef[56 + c]) ==
-        0) {
+    auto q = [&](int r) -> int32_t { return kLow && r > 4 ? 0 : coef[8 * r + c]; };
+    auto d = [&](int r) -> w32 {
+      return kLow && r > 4 ? 0 : dequant(coef[8 * r + c], mult[8 * r + c]);
+    };
+    if ((q(1) | q(2) | q(3) | q(5) | q(6) | q(7)) == 0) {
       const w32 dc = d(0) << 2;
       for (int r = 0; r < 4; ++r) ws[r][c] = dc;
       continue;
@@ -85,19 +95,32 @@ void VETAJ_DoIdct_4x4(const uint8_t* centre, const uint32_t* mult, const int16_t
     ws[2][c] = sra(o.v2 + 2048, 12);
     ws[3][c] = sra(o.v3 + 2048, 12);
   }
+  // A row without other terms comes out as (w0 + 16) >> 5 either way: the
+  // 10 bits kept of ((w0 << 14) + (1 << 18)) >> 19 are those of
+  // (w0 + 16) >> 5.
   for (int r = 0; r < 4; ++r) {
     const w32* w = ws[r];
+    const w32 w6 = kLow ? 0 : w[6];
+    const w32 w7 = kLow ? 0 : w[7];
     uint8_t* out = rows[r] + col;
-    if ((w[1] | w[2] | w[3] | w[5] | w[6] | w[7]) == 0) {
-      std::memset(out, sample(centre, w[0] + 16, 5), 4);
-      continue;
-    }
-    const Out4 o = kernel4x4((w[0] << 14) + (1u << 18), w[1], w[2], w[3], w[5], w[6], w[7]);
+    const Out4 o = kernel4x4((w[0] << 14) + (1u << 18), w[1], w[2], w[3], w[5], w6, w7);
     out[0] = sample(centre, o.v0, 19);
     out[1] = sample(centre, o.v1, 19);
     out[2] = sample(centre, o.v2, 19);
     out[3] = sample(centre, o.v3, 19);
   }
+}
+
+}  // namespace
+
+void VETAJ_DoIdct_4x4(const uint8_t* centre, const uint32_t* mult, const int16_t* coef,
+                      uint8_t** rows, uint32_t col) {
+  idct_4x4<false>(centre, mult, coef, rows, col);
+}
+
+void vj_idct_4x4_low(const uint8_t* centre, const uint32_t* mult, const int16_t* coef,
+                     uint8_t** rows, uint32_t col) {
+  idct_4x4<true>(centre, mult, coef, rows, col);
 }
 
 namespace {
@@ -118,22 +141,18 @@ inline void idct_2x2(const uint8_t* centre, const uint32_t* mult, const int16_t*
     auto d = [&](int r) -> w32 {
       return kLow && r > 1 ? 0 : dequant(coef[8 * r + c], mult[8 * r + c]);
     };
-    if ((q(1) | q(3) | q(5) | q(7)) == 0) {
-      ws[0][c] = ws[1][c] = d(0) << 2;
-      continue;
-    }
+    // Selected rather than branched on: blocks mix both kinds unpredictably.
+    const bool flat = (q(1) | q(3) | q(5) | q(7)) == 0;
     const w32 t10 = (d(0) << 15) + 4096;
     const w32 t0 = odd2x2(d(1), d(3), d(5), d(7));
-    ws[0][c] = sra(t10 + t0, 13);
-    ws[1][c] = sra(t10 - t0, 13);
+    ws[0][c] = flat ? d(0) << 2 : sra(t10 + t0, 13);
+    ws[1][c] = flat ? d(0) << 2 : sra(t10 - t0, 13);
   }
+  // A row without odd terms comes out as (w0 + 16) >> 5 either way: the
+  // 10 bits kept of ((w0 + 16) << 15) >> 20 are those of (w0 + 16) >> 5.
   for (int r = 0; r < 2; ++r) {
     const w32* w = ws[r];
     uint8_t* out = rows[r] + col;
-    if ((w[1] | w[3] | w[5] | w[7]) == 0) {
-      out[0] = out[1] = sample(centre, w[0] + 16, 5);
-      continue;
-    }
     const w32 t10 = (w[0] << 15) + (1u << 19);
     const w32 t0 = odd2x2(w[1], w[3], w[5], w[7]);
     out[0] = sample(centre, t10 + t0, 20);
