@@ -39,6 +39,13 @@ constexpr w32 kFix_2_562915447 = fix(20995);
 constexpr w32 kFix_3_072711026 = fix(25172);
 constexpr int kConstBits = 13;
 
+// c ? a : b without a branch, for choices that vary unpredictably from
+// block to block.
+inline w32 pick(bool c, w32 a, w32 b) {
+  const w32 m = 0u - static_cast<w32>(c);
+  return (a & m) | (b & ~m);
+}
+
 // Final sample lookup: the value shifted right by s, masked to 10 bits, in
 // the table's centre. For s <= 22 the low 10 bits of a logical and an
 // arithmetic shift agree, so the unsigned shift is exact.

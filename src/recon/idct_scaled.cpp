@@ -145,8 +145,8 @@ inline void idct_2x2(const uint8_t* centre, const uint32_t* mult, const int16_t*
     const bool flat = (q(1) | q(3) | q(5) | q(7)) == 0;
     const w32 t10 = (d(0) << 15) + 4096;
     const w32 t0 = odd2x2(d(1), d(3), d(5), d(7));
-    ws[0][c] = flat ? d(0) << 2 : sra(t10 + t0, 13);
-    ws[1][c] = flat ? d(0) << 2 : sra(t10 - t0, 13);
+    ws[0][c] = pick(flat, d(0) << 2, sra(t10 + t0, 13));
+    ws[1][c] = pick(flat, d(0) << 2, sra(t10 - t0, 13));
   }
   // A row without odd terms comes out as (w0 + 16) >> 5 either way: the
   // 10 bits kept of ((w0 + 16) << 15) >> 20 are those of (w0 + 16) >> 5.
