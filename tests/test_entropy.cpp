@@ -34,32 +34,42 @@ HuffTable luma_dc() {
 // two 10-bit codes.
 HuffTable test_ac() { return table({{2, 2}, {3, 1}, {4, 1}, {10, 2}}, {0x00, 0x01, 0xF0, 0x22, 0x13, 0x31}); }
 
-struct Tables {
+// A decoder record as the marker parser leaves it (the first component
+// sampled as given, every table defined), freed as the decoder frees it.
+struct Frame {
   DecoderInfo d{};
-  MarkerState m{};
-  EntropyState e{};
-  Tables() {
-    d.marker = &m;
-    m.frame_kind = kFrameBaseline;
+  HuffTable dc = luma_dc(), ac = test_ac();
+  explicit Frame(std::vector<std::pair<int, int>> samp = {{1, 1}}) {
+    d.marker = vj::fake_alloc_zeroed<MarkerState>();
+    d.marker->frame_kind = kFrameBaseline;
+    d.entropy = vj::alloc_zeroed<EntropyState>();
+    d.components = vj::alloc_zeroed<ComponentInfo>(4);
+    d.quant_tables[0] = vj::alloc_zeroed<QuantTable>();
+    d.image_width = d.image_height = 64;
+    d.num_components = d.comps_in_scan = static_cast<uint8_t>(samp.size());
+    for (size_t i = 0; i < samp.size(); ++i) {
+      ComponentInfo& c = d.components[i];
+      d.dc_huff[i] = &dc;
+      d.ac_huff[i] = &ac;
+      c.index = static_cast<uint8_t>(i);
+      c.h_samp = static_cast<uint8_t>(samp[i].first);
+      c.v_samp = static_cast<uint8_t>(samp[i].second);
+      d.max_h_samp = std::max(d.max_h_samp, c.h_samp);
+      d.max_v_samp = std::max(d.max_v_samp, c.v_samp);
+      d.scan_components[i] = &c;
+    }
+    vj_setup_component_geometry(&d);
   }
-  ~Tables() {
-    for (uint32_t i = 0; i < d.derived_count; ++i) vj_free_derived_table(d.derived_tables[i]);
-    KOLVAVETA_OsFree(d.derived_tables);
-    for (auto* s : e.ac_skip) KOLVAVETA_OsFree(s);
-  }
+  ~Frame() { VETAJ_DeleteDecoderInfo(&d); }
   int32_t prepare(int is_dc, int number, DerivedHuffTable** t, bool progressive = false) {
-    return (progressive ? VETAJ_P_PrepareDerivedTbl : VETAJ_PrepareDerivedTbl)(&d, is_dc, number, t, &e);
+    return (progressive ? VETAJ_P_PrepareDerivedTbl : VETAJ_PrepareDerivedTbl)(&d, is_dc, number, t, d.entropy);
   }
 };
 
 TEST(HuffTables, StandardLuminanceDcTable) {
-  Tables f;
-  HuffTable h = luma_dc();
-  f.d.dc_huff[0] = &h;
+  Frame f;
   DerivedHuffTable* t = nullptr;
   ASSERT_EQ(f.prepare(1, 0, &t), 200);
-  EXPECT_EQ(t->maxcode[1], -1);
-  EXPECT_EQ(t->maxcode[2], 0);
   EXPECT_EQ(t->maxcode[3], 6);
   EXPECT_EQ(t->maxcode[17], 0xFFFFF);
   for (int v = 0; v < 0x40; ++v) EXPECT_EQ(t->lookahead[v], (2u << 8) | 0u);
@@ -83,7 +93,7 @@ TEST(HuffTables, InvalidTablesAreRefused) {
     int is_dc, number;
   } cases[] = {{nullptr, 1, 0}, {&too_many, 1, 7}, {&too_many, 0, 0}, {&over, 0, 1}, {&dc16, 1, 2}};
   for (const auto& c : cases) {
-    Tables f;
+    Frame f;
     if (c.number < 4) (c.is_dc ? f.d.dc_huff : f.d.ac_huff)[c.number] = c.h;
     DerivedHuffTable* t = nullptr;
     EXPECT_EQ(f.prepare(c.is_dc, c.number, &t), 201) << c.is_dc << " " << c.number;
@@ -91,13 +101,11 @@ TEST(HuffTables, InvalidTablesAreRefused) {
 }
 
 TEST(HuffTables, SkipTableCoversSymbolsAndEndOfBlock) {
-  Tables f;
+  Frame f;
   f.d.scale_shift = 1;  // reduced output wants skip tables
-  HuffTable h = test_ac();
-  f.d.ac_huff[0] = &h;
   DerivedHuffTable* t = nullptr;
   ASSERT_EQ(f.prepare(0, 0, &t), 200);
-  const AcSkipTable* s = f.e.ac_skip[0];
+  const AcSkipTable* s = f.d.entropy->ac_skip[0];
   ASSERT_NE(s, nullptr);
   EXPECT_EQ(s->entry[0x00], 2u | (128u << 16));  // end of block at once
   // (0,1) with its magnitude bit, again, then end of block: 2+1+2+1+2 bits.
@@ -106,72 +114,35 @@ TEST(HuffTables, SkipTableCoversSymbolsAndEndOfBlock) {
   EXPECT_EQ(t->lookahead[0xFF], kLongCode);
   // The skip table follows a redefinition of the same table number: "01" is
   // now the end of block.
-  HuffTable other = test_ac();
-  std::swap(other.huffval[0], other.huffval[1]);
-  f.d.ac_huff[0] = &other;
+  std::swap(f.ac.huffval[0], f.ac.huffval[1]);
   ASSERT_EQ(f.prepare(0, 0, &t), 200);
-  EXPECT_EQ(f.e.ac_skip[0]->entry[0b01000000], 2u | (128u << 16));
+  EXPECT_EQ(f.d.entropy->ac_skip[0]->entry[0b01000000], 2u | (128u << 16));
 }
 
 // ---------------------------------------------------------------------------
 // Scan set-up
 
-struct ScanSetup {
-  DecoderInfo d{};
-  MarkerState m{};
-  ComponentInfo comps[4]{};
-  HuffTable dc = luma_dc(), ac = test_ac();
-  QuantTable q[4]{};
-  explicit ScanSetup(std::vector<std::pair<int, int>> samp) {
-    d.marker = &m;
-    m.frame_kind = kFrameBaseline;
-    d.components = comps;
-    d.image_width = d.image_height = 64;
-    d.num_components = d.comps_in_scan = static_cast<uint8_t>(samp.size());
-    d.quant_tables[0] = &q[0];
-    for (size_t i = 0; i < samp.size(); ++i) {
-      d.dc_huff[i] = &dc;
-      d.ac_huff[i] = &ac;
-      comps[i].index = static_cast<uint8_t>(i);
-      comps[i].h_samp = static_cast<uint8_t>(samp[i].first);
-      comps[i].v_samp = static_cast<uint8_t>(samp[i].second);
-      d.max_h_samp = std::max<uint8_t>(d.max_h_samp, comps[i].h_samp);
-      d.max_v_samp = std::max<uint8_t>(d.max_v_samp, comps[i].v_samp);
-      d.scan_components[i] = &comps[i];
-    }
-    vj_setup_component_geometry(&d);
-  }
-  ~ScanSetup() {
-    for (uint32_t i = 0; i < d.derived_count; ++i) vj_free_derived_table(d.derived_tables[i]);
-    KOLVAVETA_OsFree(d.derived_tables);
-    KOLVAVETA_OsFree(d.entropy);
-    for (auto* t : d.quant_tables)
-      if (t < q || t >= q + 4) KOLVAVETA_OsFree(t);
-  }
-};
-
 TEST(ScanSetup, TenBlocksPerMcuIsTheLimit) {
-  ScanSetup eleven({{2, 2}, {2, 2}, {2, 2}, {2, 2}});
+  Frame eleven({{2, 2}, {2, 2}, {2, 2}, {2, 2}});
   EXPECT_EQ(VETAJ_SetupScan(&eleven.d), 201);
-  ScanSetup seven({{2, 2}, {2, 1}, {1, 1}});
+  Frame seven({{2, 2}, {2, 1}, {1, 1}});
   ASSERT_EQ(VETAJ_SetupScan(&seven.d), 200);
   EXPECT_EQ(seven.d.blocks_in_mcu, 7);
 }
 
 TEST(ScanSetup, MissingQuantTablesAreCopiedDownwardOrRefused) {
-  ScanSetup f({{1, 1}});
-  f.d.quant_tables[0] = nullptr;
-  f.d.quant_tables[1] = &f.q[1];
-  f.q[1].values[0] = 77;
+  Frame f;
+  std::swap(f.d.quant_tables[0], f.d.quant_tables[1]);  // only table 1
+  f.d.quant_tables[1]->values[0] = 77;
   ASSERT_EQ(VETAJ_SetupScan(&f.d), 200);
   ASSERT_NE(f.d.quant_tables[0], nullptr);
-  EXPECT_NE(f.d.quant_tables[0], &f.q[1]);  // a copy
+  EXPECT_NE(f.d.quant_tables[0], f.d.quant_tables[1]);  // a copy
   EXPECT_EQ(f.d.quant_tables[0]->values[0], 77);
-  EXPECT_EQ(f.comps[0].quant, f.d.quant_tables[0]);
+  EXPECT_EQ(f.d.components[0].quant, f.d.quant_tables[0]);
 
-  ScanSetup g({{1, 1}});
-  g.d.quant_tables[2] = &g.q[2];
-  g.comps[0].quant_no = 1;  // tables 0 and 2 exist, 1 does not
+  Frame g;
+  g.d.quant_tables[2] = vj::alloc_zeroed<QuantTable>();
+  g.d.components[0].quant_no = 1;  // tables 0 and 2 exist, 1 does not
   EXPECT_EQ(VETAJ_SetupScan(&g.d), 201);
 }
 
