@@ -85,13 +85,17 @@ std::vector<std::string> progressive_fixtures() {
       [](const std::string&, const vjtest::OracleHeader& h) { return h.progressive != 0; });
 }
 
+vjtest::ColourAt ycc_samples(const vjtest::OraclePlanes& p) {
+  return [&p](int x, int y) { return vjtest::Colour{true, p.at(x, y, 0), p.at(x, y, 1), p.at(x, y, 2)}; };
+}
+
 class Progressive : public ::testing::TestWithParam<std::string> {};
 
-// The luma plane equals libjpeg-turbo's accurate output of the scans kept:
-// at full size the first 30, at 1/2 and 1/4 those the reduced transform
-// needs, at 1/8 the DC values of the first scan when it carries every
-// component.
-TEST_P(Progressive, LumaFollowsTheScansKeptAtEveryScale) {
+// The luma plane (at full size the chroma too) equals libjpeg-turbo's
+// accurate output of the scans kept: at full size the first 30, at 1/2 and
+// 1/4 those the reduced transform needs, at 1/8 the DC values of the first
+// scan when it carries every component.
+TEST_P(Progressive, FollowsTheScansKeptAtEveryScale) {
   const auto jpeg = vjtest::read_fixture(GetParam());
   vjtest::OracleHeader h;
   ASSERT_TRUE(vjtest::oracle_header(jpeg, &h));
@@ -108,6 +112,9 @@ TEST_P(Progressive, LumaFollowsTheScansKeptAtEveryScale) {
     const auto d = decode(jpeg, KOLVAVETA_FMT_YUV420, w, hh);
     ASSERT_EQ(d.ok, 1) << shift;
     EXPECT_TRUE(vjtest::same_luma(d.buffer, w, hh, ref)) << "1/" << (1 << shift) << ", " << kept << " scans";
+    if (shift == 0 && h.jpeg_color_space == 3) {  // full size keeps the chroma samples too
+      EXPECT_TRUE(vjtest::shows(d, vjtest::Placement::centred(KOLVAVETA_FMT_YUV420, w, hh, w, hh), ycc_samples(ref)));
+    }
   }
 }
 
@@ -135,8 +142,7 @@ TEST(ProgressiveDecoding, SequentialFramesWithOneScanPerComponent) {
     ASSERT_TRUE(vjtest::oracle_planes(jpeg, 1, &p));
     const auto d = decode(jpeg, KOLVAVETA_FMT_RGBA8888, p.width, p.height);
     EXPECT_TRUE(vjtest::shows(d, vjtest::Placement::centred(KOLVAVETA_FMT_RGBA8888, p.width, p.height, p.width, p.height),
-                              [&p](int x, int y) { return vjtest::Colour{true, p.at(x, y, 0), p.at(x, y, 1), p.at(x, y, 2)}; }))
-        << name;
+                              ycc_samples(p))) << name;
   }
 }
 
