@@ -1,10 +1,7 @@
 // The fixture corpus itself: every file is listed in the manifest, the bad
-// files are what they claim to be, and the oracle reads the good ones in the
-// conventions the other tests rely on.
+// files are what they claim to be, and the oracle survives broken input.
 #include <gtest/gtest.h>
 
-#include <algorithm>
-#include <cmath>
 #include <sstream>
 #include <string>
 #include <vector>
@@ -72,11 +69,7 @@ TEST_P(BadFixture, HasAFrameTheDecoderMustReject) {
 INSTANTIATE_TEST_SUITE_P(Corpus, BadFixture, ::testing::ValuesIn(bad_fixtures()),
                          [](const auto& p) { return fixture_test_name(p.param); });
 
-TEST(Oracle, ReadsTiffContainersAndRefusesBrokenInput) {
-  for (const std::string& name : list_fixtures(".tif")) {
-    OracleHeader h;
-    EXPECT_TRUE(oracle_header(read_fixture(name), &h)) << name;
-  }
+TEST(Oracle, RefusesBrokenInputWithoutEndingTheProcess) {
   const std::vector<uint8_t> good = read_fixture("base_420_q75_64x48.jpg");
   ASSERT_FALSE(good.empty());
   const std::vector<uint8_t> no_scan(good.begin(), good.begin() + 100);  // cut inside the tables
@@ -89,29 +82,6 @@ TEST(Oracle, ReadsTiffContainersAndRefusesBrokenInput) {
     EXPECT_FALSE(oracle_planes(bad, 1, &p));
   }
   EXPECT_TRUE(oracle_planes(good, 1, &p)) << "still usable after failures";
-}
-
-// The coefficients and quantisation values come back in natural order: a
-// floating-point inverse DCT of them reproduces the oracle's own samples.
-TEST(Oracle, CoefficientsAndQuantisationAreInNaturalOrder) {
-  const std::vector<uint8_t> bytes = read_fixture("grey_q90_64x48.jpg");
-  std::vector<OracleComponent> comps;
-  OraclePlanes planes;
-  ASSERT_TRUE(oracle_coefficients(bytes, &comps));
-  ASSERT_TRUE(oracle_planes(bytes, 1, &planes));
-  const OracleComponent& c = comps.at(0);
-  const double pi = std::acos(-1.0);
-  const auto basis = [pi](int n, int f) { return (f ? 1.0 : std::sqrt(0.5)) * std::cos((2 * n + 1) * f * pi / 16); };
-  int worst = 0;
-  for (int py = 0; py < planes.height; ++py)
-    for (int px = 0; px < planes.width; ++px) {
-      const int16_t* blk = c.block(py / 8, px / 8);
-      double sum = 0;
-      for (int k = 0; k < 64; ++k) sum += blk[k] * c.quant[k] * basis(px % 8, k % 8) * basis(py % 8, k / 8);
-      const int sample = std::clamp(int(std::lround(sum / 4 + 128)), 0, 255);
-      worst = std::max(worst, std::abs(sample - planes.at(px, py, 0)));
-    }
-  EXPECT_LE(worst, 1);
 }
 
 #endif  // VETAJ_HAVE_LIBJPEG

@@ -30,15 +30,6 @@ TEST(Platform, FakeMallocAlignsAndKeepsTheRawAddressInside) {
   VETA_FakeFree(nullptr);
 }
 
-TEST(Platform, ThreadCreateReportsOneAndJoins) {
-  static int flag = 0;
-  uintptr_t thread = 0;
-  ASSERT_EQ(KOLVAVETA_OsThreadCreate([](void* arg) -> void* { return *static_cast<int*>(arg) = 7, nullptr; },
-                                     &flag, &thread), 1);
-  EXPECT_EQ(KOLVAVETA_OsThreadWait(thread, 0), 0);
-  EXPECT_EQ(flag, 7);
-}
-
 std::vector<uint8_t> bytes(size_t n) {
   std::vector<uint8_t> v(n);
   for (size_t i = 0; i < n; ++i) v[i] = static_cast<uint8_t>(i * 7 + 1);

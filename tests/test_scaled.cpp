@@ -10,7 +10,6 @@
 #include "VetaJpegDecoder.h"
 #include "drivers/decode.h"
 #include "drivers/init.h"
-#include "drivers/scaled.h"
 #include "recon/idct.h"
 #include "support/decoding.h"
 #include "support/files.h"
@@ -43,13 +42,6 @@ Decoded decode_frame(const Bytes& jpeg, int width, int height, int mode) {
   out.ok = VETAJ_DecodeFrame(o.get(), &w, out.buffer.data(), width, height);
   vj::window_close(&w);
   return out;
-}
-
-TEST(ScaledHelpers, GcdOfNegativeAndZeroValues) {
-  EXPECT_EQ(VETAJ_GetGCD(-12, 0), 12);
-  EXPECT_EQ(VETAJ_GetGCD(-12, 18), 6);
-  EXPECT_EQ(LCM(4, 6), 12u);
-  EXPECT_EQ(round_up_pow2(33, 32), 64u);
 }
 
 #if VETAJ_HAVE_LIBJPEG
