@@ -8,44 +8,26 @@
 
 #include "io/stream.h"
 #include "support/files.h"
+#include "support/segments.h"
 
 namespace {
 
-TEST(Platform, OpenFileRefusesDirectoriesAndMissingFiles) {
-  EXPECT_EQ(KOLVAVETA_OpenFile("/tmp"), ~uintptr_t(0));
-  EXPECT_EQ(KOLVAVETA_OpenFile("/nonexistent/file.jpg"), ~uintptr_t(0));
-}
+using vjtest::CallbackSource;
 
 TEST(Platform, FakeMallocAlignsAndKeepsTheRawAddressInside) {
   for (uint32_t size : {0u, 1u, 15u, 16u, 17u, 1000u}) {
-    for (int i = 0; i < 8; ++i) {
-      uint8_t* p = static_cast<uint8_t*>(VETA_FakeMalloc(nullptr, size));
-      ASSERT_NE(p, nullptr);
-      EXPECT_EQ(reinterpret_cast<uintptr_t>(p) % 16, 0u);
-      uint8_t* raw = static_cast<uint8_t*>(*(reinterpret_cast<void**>(p) - 1));
-      EXPECT_GE(p - raw, static_cast<ptrdiff_t>(sizeof(void*)));
-      // The whole block lies inside the raw allocation (size + 32, rounded).
-      EXPECT_LE(p + size, raw + ((size + 32 + 15) & ~15u));
-      std::memset(p, 0xAB, size);
-      VETA_FakeFree(p);
-    }
+    uint8_t* p = static_cast<uint8_t*>(VETA_FakeMalloc(nullptr, size));
+    ASSERT_NE(p, nullptr);
+    EXPECT_EQ(reinterpret_cast<uintptr_t>(p) % 16, 0u);
+    // The raw address sits just before the block, which lies inside the raw
+    // allocation (size + 32, rounded).
+    uint8_t* raw = static_cast<uint8_t*>(*(reinterpret_cast<void**>(p) - 1));
+    EXPECT_GE(p - raw, static_cast<ptrdiff_t>(sizeof(void*)));
+    EXPECT_LE(p + size, raw + ((size + 32 + 15) & ~15u));
+    std::memset(p, 0xAB, size);
+    VETA_FakeFree(p);
   }
   VETA_FakeFree(nullptr);
-}
-
-TEST(Platform, ThreadCreateReportsOneAndJoins) {
-  static int flag = 0;
-  uintptr_t thread = 0;
-  auto body = [](void* arg) -> void* {
-    *static_cast<int*>(arg) = 7;
-    return nullptr;
-  };
-  ASSERT_EQ(KOLVAVETA_OsThreadCreate(body, &flag, &thread), 1);
-  EXPECT_EQ(KOLVAVETA_OsThreadWait(thread, 0), 0);
-  EXPECT_EQ(flag, 7);
-  int32_t status = 5;
-  KOLVAVETA_CheckExStatus(&status);
-  EXPECT_EQ(status, 0);
 }
 
 std::vector<uint8_t> bytes(size_t n) {
@@ -62,14 +44,12 @@ TEST(Stream, MemoryReadsAndSeeksStayWithinTheBlock) {
   EXPECT_EQ(KOLVAVETA_Seek_IO(s, 90, 0), 90);
   EXPECT_EQ(KOLVAVETA_Read_IO(s, out, 20), 10);
   EXPECT_EQ(out[0], data[90]);
-  EXPECT_EQ(s->position, 100u);
   EXPECT_EQ(KOLVAVETA_Read_IO(s, out, 20), 0);
   EXPECT_EQ(KOLVAVETA_Seek_IO(s, 150, 0), 100);
   EXPECT_EQ(KOLVAVETA_Seek_IO(s, -1, 0), -1);
   EXPECT_EQ(KOLVAVETA_Seek_IO(s, 1, 2), -1);
   EXPECT_EQ(KOLVAVETA_Seek_IO(s, -10, 2), 90);
-  // A relative seek before the start lands at the end.
-  EXPECT_EQ(KOLVAVETA_Seek_IO(s, -95, 1), 100);
+  EXPECT_EQ(KOLVAVETA_Seek_IO(s, -95, 1), 100);  // before the start: lands at the end
   // Window reads never copy: the pointer moves through the block.
   EXPECT_EQ(KOLVAVETA_Seek_IO(s, 40, 0), 40);
   uint8_t* p = nullptr;
@@ -81,86 +61,64 @@ TEST(Stream, MemoryReadsAndSeeksStayWithinTheBlock) {
   EXPECT_EQ(KOLVAVETA_Close_IO(s), 1);
 }
 
-TEST(Stream, OpenRefusesBadKindsAndEmptyMemory) {
+TEST(Stream, OpenRefusesBadKindsEmptyMemoryAndNonFiles) {
+  EXPECT_EQ(KOLVAVETA_OpenFile("/tmp"), ~uintptr_t(0));
+  EXPECT_EQ(KOLVAVETA_OpenFile("/nonexistent/file.jpg"), ~uintptr_t(0));
   uint8_t b = 0;
-  gKOLVAVETA_Error = 0;
-  EXPECT_EQ(KOLVAVETA_Open_IO(3, &b, 1), nullptr);
-  EXPECT_EQ(gKOLVAVETA_Error, 11);
-  EXPECT_EQ(KOLVAVETA_Open_IO(1, &b, 0), nullptr);
-  EXPECT_EQ(gKOLVAVETA_Error, 12);
-  EXPECT_EQ(KOLVAVETA_Open_IO(0, const_cast<char*>("/nonexistent/x"), 0), nullptr);
-  EXPECT_EQ(gKOLVAVETA_Error, 13);
-  EXPECT_EQ(KOLVAVETA_Open_IO(0, const_cast<char*>("/tmp"), 0), nullptr);
-  EXPECT_EQ(gKOLVAVETA_Error, 13);
-  EXPECT_EQ(KOLVAVETA_Open_IO(2, nullptr, 0), nullptr);
-  EXPECT_EQ(gKOLVAVETA_Error, 13);
+  const struct {
+    int kind;
+    void* source;
+    uint32_t size;
+    int error;
+  } cases[] = {{3, &b, 1, 11}, {1, &b, 0, 12}, {0, const_cast<char*>("/nonexistent/x"), 0, 13},
+               {0, const_cast<char*>("/tmp"), 0, 13}, {2, nullptr, 0, 13}};
+  for (const auto& c : cases) {
+    gKOLVAVETA_Error = 0;
+    EXPECT_EQ(KOLVAVETA_Open_IO(c.kind, c.source, c.size), nullptr) << c.kind;
+    EXPECT_EQ(gKOLVAVETA_Error, c.error) << c.kind;
+  }
 }
 
-TEST(Stream, FileByPathMeasuresItsSizeOnlyWhenAskedTo) {
-  vjtest::TempFile f(bytes(5000));
-  IoStream* s = KOLVAVETA_Open_IO(0, const_cast<char*>(f.path().c_str()), 0);
-  ASSERT_NE(s, nullptr);
-  EXPECT_EQ(s->size, 5000u);
-  EXPECT_EQ(s->position, 0u);
-  EXPECT_STREQ(s->path_copy, f.path().c_str());
-  uint8_t out[10];
-  EXPECT_EQ(KOLVAVETA_Read_IO(s, out, 10), 10);
-  EXPECT_EQ(out[3], bytes(5000)[3]);
-  EXPECT_EQ(KOLVAVETA_Close_IO(s), 1);
-  IoStream* t = KOLVAVETA_Open_IO(0, const_cast<char*>(f.path().c_str()), 1234);
-  ASSERT_NE(t, nullptr);
-  EXPECT_EQ(t->size, 1234u);
-  KOLVAVETA_Close_IO(t);
-}
-
-TEST(Stream, FileHandleRecordsOriginAndRewindsWhenSizeUnknown) {
-  vjtest::TempFile f(bytes(300));
+TEST(Stream, FilesMeasureTheirSizeOnlyWhenAskedToAndHandlesRewind) {
+  const auto data = bytes(300);
+  vjtest::TempFile f(data);
+  for (uint32_t size : {0u, 123u}) {
+    IoStream* s = KOLVAVETA_Open_IO(0, const_cast<char*>(f.path().c_str()), size);
+    ASSERT_NE(s, nullptr);
+    EXPECT_EQ(s->size, size ? size : 300u);
+    uint8_t out[10];
+    EXPECT_EQ(KOLVAVETA_Read_IO(s, out, 10), 10);
+    EXPECT_EQ(out[3], data[3]);
+    EXPECT_EQ(KOLVAVETA_Close_IO(s), 1);
+  }
+  // A handle records where the caller left it, and is rewound when its size
+  // is unknown; the caller's handle stays open.
   FILE* fp = std::fopen(f.path().c_str(), "rb");
   ASSERT_NE(fp, nullptr);
   std::fseek(fp, 17, SEEK_SET);
   IoStream* s = KOLVAVETA_Open_IO(2, fp, 0);
   ASSERT_NE(s, nullptr);
   EXPECT_EQ(s->origin, 17u);
-  EXPECT_EQ(s->size, 0u);
   EXPECT_EQ(std::ftell(fp), 0);
   KOLVAVETA_Close_IO(s);
-  // The caller's handle stays open.
-  EXPECT_EQ(std::fgetc(fp), bytes(300)[0]);
+  EXPECT_EQ(std::fgetc(fp), data[0]);
   std::fclose(fp);
 }
 
-struct CallbackSource {
-  std::vector<uint8_t> data;
-  size_t pos = 0;
-  int rewinds = 0;
-};
-
-int32_t cb_read(void* src, void* buf, uint32_t n) {
-  auto* c = static_cast<CallbackSource*>(src);
-  const size_t k = std::min<size_t>(n, c->data.size() - c->pos);
-  std::memcpy(buf, c->data.data() + c->pos, k);
-  c->pos += k;
-  return static_cast<int32_t>(k);
-}
-int32_t cb_skip(void* src, void*, uint32_t n) {
-  auto* c = static_cast<CallbackSource*>(src);
-  c->pos = std::min(c->data.size(), c->pos + n);
-  return static_cast<int32_t>(c->pos);
-}
-int32_t cb_rewind(void* src, void*, uint32_t) {
-  auto* c = static_cast<CallbackSource*>(src);
-  c->pos = 0;
-  ++c->rewinds;
-  return 0;
+int g_rewinds = 0;
+int32_t counting_rewind(void* source, void* buffer, uint32_t count) {
+  ++g_rewinds;
+  return CallbackSource::rewind(source, buffer, count);
 }
 
 TEST(Stream, CallbackStreamSeeksThroughSkipAndRewind) {
   CallbackSource src{bytes(1000)};
-  IoStream* s = KOLVAVETA_Open_Stream(&src, cb_read, cb_skip, cb_rewind, 1000);
+  g_rewinds = 0;
+  IoStream* s = KOLVAVETA_Open_Stream(&src, CallbackSource::read, CallbackSource::skip, counting_rewind, 1000);
   ASSERT_NE(s, nullptr);
-  EXPECT_EQ(src.rewinds, 0);  // opening calls no callback
+  EXPECT_EQ(g_rewinds, 0);  // opening calls no callback
   EXPECT_EQ(KOLVAVETA_Seek_IO(s, 200, 0), 200);
-  EXPECT_EQ(src.rewinds, 1);
+  EXPECT_EQ(g_rewinds, 1);
   uint8_t out[4];
   EXPECT_EQ(KOLVAVETA_Read_IO(s, out, 4), 4);
   EXPECT_EQ(out[0], src.data[200]);
@@ -169,8 +127,7 @@ TEST(Stream, CallbackStreamSeeksThroughSkipAndRewind) {
   EXPECT_EQ(src.pos, 900u);
   KOLVAVETA_Close_IO(s);
   // Without a rewind callback absolute seeks answer 0 and do not move.
-  CallbackSource src2{bytes(100)};
-  IoStream* t = KOLVAVETA_Open_Stream(&src2, cb_read, cb_skip, nullptr, 100);
+  IoStream* t = KOLVAVETA_Open_Stream(&src, CallbackSource::read, CallbackSource::skip, nullptr, 1000);
   EXPECT_EQ(KOLVAVETA_Read_IO(t, out, 4), 4);
   EXPECT_EQ(KOLVAVETA_Seek_IO(t, 50, 0), 0);
   EXPECT_EQ(t->position, 4u);
@@ -183,26 +140,20 @@ TEST(Window, RefillDeliversTheInputInOrderForEveryKind) {
   auto data = bytes(40000);
   vjtest::TempFile f(data);
   CallbackSource src{data};
-  std::vector<IoStream*> streams = {
-      KOLVAVETA_Open_IO(1, data.data(), static_cast<uint32_t>(data.size())),
-      KOLVAVETA_Open_IO(0, const_cast<char*>(f.path().c_str()), 0),
-      KOLVAVETA_Open_Stream(&src, cb_read, cb_skip, cb_rewind,
-                            static_cast<uint32_t>(data.size()))};
-  for (IoStream* s : streams) {
+  const uint32_t size = static_cast<uint32_t>(data.size());
+  for (IoStream* s : {KOLVAVETA_Open_IO(1, data.data(), size),
+                      KOLVAVETA_Open_IO(0, const_cast<char*>(f.path().c_str()), 0),
+                      KOLVAVETA_Open_Stream(&src, CallbackSource::read, CallbackSource::skip,
+                                            CallbackSource::rewind, size)}) {
     ASSERT_NE(s, nullptr);
     StreamWindow w;
     ASSERT_TRUE(vj::window_open(&w, s));
-    size_t pos = 0;
     // Read in irregular chunks, asking for a few bytes at a time.
-    while (pos < data.size()) {
+    for (size_t pos = 0; pos < data.size();) {
       const uint32_t need = static_cast<uint32_t>(std::min<size_t>(1 + pos % 23, data.size() - pos));
       ASSERT_NE(VETAJ_CheckBuffer(&w, need), 0) << "at " << pos;
-      for (uint32_t i = 0; i < need; ++i) {
+      for (uint32_t i = 0; i < need; ++i, ++pos, ++w.index, --w.remaining)
         ASSERT_EQ(w.window[w.index], data[pos]) << "kind " << s->kind << " at " << pos;
-        ++w.index;
-        --w.remaining;
-        ++pos;
-      }
       ASSERT_EQ(vj::window_tell(&w), pos);
     }
     EXPECT_EQ(VETAJ_CheckBuffer(&w, 1), 0);  // end of input
@@ -220,15 +171,12 @@ TEST(Window, RefillDeliversTheInputInOrderForEveryKind) {
     vj::window_close(&w);
     KOLVAVETA_Close_IO(s);
   }
-}
-
-TEST(Window, RequestsBeyondTheInputFailInsteadOfOverrunning) {
-  auto data = bytes(10);
+  // Requests beyond the input fail instead of overrunning, keeping what exists.
   IoStream* s = KOLVAVETA_Open_IO(1, data.data(), 10);
   StreamWindow w;
   ASSERT_TRUE(vj::window_open(&w, s));
   EXPECT_EQ(VETAJ_CheckBuffer(&w, 17), 0);
-  EXPECT_EQ(w.remaining, 10u);  // what exists is still there
+  EXPECT_EQ(w.remaining, 10u);
   EXPECT_EQ(VETAJ_CheckBuffer(&w, 10), 2);
   vj::window_close(&w);
   KOLVAVETA_Close_IO(s);

@@ -24,12 +24,8 @@ class TempFile {
   std::string path_;
 };
 
-// Directory of the fixture corpus.
-std::string data_dir();
 // Bytes of a fixture (empty when it does not exist).
 std::vector<uint8_t> read_fixture(const std::string& name);
-// Bytes of any file.
-std::vector<uint8_t> read_file(const std::string& path);
 // Names of the fixtures whose names end with `suffix` (sorted).
 std::vector<std::string> list_fixtures(const std::string& suffix = ".jpg");
 

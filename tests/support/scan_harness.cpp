@@ -13,14 +13,12 @@ ScanHarness::~ScanHarness() {
   }
   vj::window_close(&window_);
   if (obj_ != nullptr) KOLVAVETA_DestroyDecInfo(obj_);
-  delete[] area_;
 }
 
 bool ScanHarness::open(const std::vector<uint8_t>& jpeg, uint32_t options) {
   obj_ = KOLVAVETA_CreateDecInfo(1, const_cast<uint8_t*>(jpeg.data()),
                                  static_cast<uint32_t>(jpeg.size()), 7, options);
-  if (obj_ == nullptr) return false;
-  if (!vj::window_open(&window_, obj_->stream)) return false;
+  if (obj_ == nullptr || !vj::window_open(&window_, obj_->stream)) return false;
   d_ = vj::alloc_zeroed<DecoderInfo>();
   d_->marker = vj::fake_alloc_zeroed<MarkerState>();
   d_->marker->adobe_transform = 1;
@@ -31,45 +29,35 @@ bool ScanHarness::open(const std::vector<uint8_t>& jpeg, uint32_t options) {
   d_->scale_num = 1;
   d_->region_map_flag = options & KOLVAVETA_OPT_REGION_MAP;
   int32_t status = vj::kStatusOk;
-  for (;;) {
-    const uint8_t code = VETAJ_ParseNextMarker(d_, &status);
+  while (VETAJ_ParseNextMarker(d_, &status) != 0xDA)
     if (status != vj::kStatusOk) return false;
-    if (code == 0xDA) break;
-  }
+  if (status != vj::kStatusOk) return false;
   vj_setup_component_geometry(d_);
   if (VETAJ_SetupScan(d_) != vj::kStatusOk) return false;
   // Entropy decoding reads from window + index.
   window_.window += window_.index;
   window_.index = 0;
-  area_ = new int16_t[10 * 64];
   for (int i = 0; i < 10; ++i) ptrs_[i] = area_ + i * 64;
-  clear_mcu();
   return true;
 }
 
-void ScanHarness::clear_mcu() { std::memset(area_, 0, sizeof(int16_t) * 10 * 64); }
+void ScanHarness::clear_mcu() { std::memset(area_, 0, sizeof area_); }
 
 void ScanHarness::block_position(uint32_t index, uint32_t b, int* comp, int* row,
                                  int* col) const {
-  const uint32_t mrow = index / d_->mcus_per_row;
-  const uint32_t mcol = index % d_->mcus_per_row;
-  if (d_->comps_in_scan == 1) {
-    *comp = d_->scan_components[0]->index;
-    *row = static_cast<int>(mrow);
-    *col = static_cast<int>(mcol);
-    return;
-  }
-  uint32_t first = 0;
-  for (uint32_t p = 0; p < d_->comps_in_scan; ++p) {
+  const uint32_t mrow = index / d_->mcus_per_row, mcol = index % d_->mcus_per_row;
+  for (uint32_t p = 0, first = 0; p < d_->comps_in_scan; ++p) {
     const ComponentInfo* c = d_->scan_components[p];
-    if (b < first + c->mcu_blocks) {
-      const uint32_t k = b - first;
+    // A scan of one component has one block per MCU.
+    const uint32_t w = d_->comps_in_scan == 1 ? 1 : c->mcu_width;
+    const uint32_t h = d_->comps_in_scan == 1 ? 1 : c->mcu_height;
+    if (b < first + w * h) {
       *comp = c->index;
-      *row = static_cast<int>(mrow * c->mcu_height + k / c->mcu_width);
-      *col = static_cast<int>(mcol * c->mcu_width + k % c->mcu_width);
+      *row = static_cast<int>(mrow * h + (b - first) / w);
+      *col = static_cast<int>(mcol * w + (b - first) % w);
       return;
     }
-    first += c->mcu_blocks;
+    first += w * h;
   }
 }
 

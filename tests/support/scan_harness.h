@@ -21,13 +21,13 @@ class ScanHarness {
   // its first scan and sets the scan up. `options` goes into the object.
   bool open(const std::vector<uint8_t>& jpeg, uint32_t options = 0);
   DecoderInfo* d() { return d_; }
-  DecInfo* object() { return obj_; }
-  // Block pointers of one MCU (zeroed by clear_mcu).
+  // Block pointers of one MCU, contiguous (zeroed by clear_mcu).
   int16_t** blocks() { return ptrs_; }
   void clear_mcu();
   uint32_t total_mcus() const { return d_->mcus_per_row * d_->mcu_rows; }
-  // Sets the current MCU position (as the row drivers do).
+  // Clears the blocks and sets the current MCU position (as the row drivers do).
   void at(uint32_t index) {
+    clear_mcu();
     d_->current_mcu_row = index / d_->mcus_per_row;
     d_->current_mcu_col = index % d_->mcus_per_row;
   }
@@ -38,7 +38,7 @@ class ScanHarness {
   DecInfo* obj_ = nullptr;
   DecoderInfo* d_ = nullptr;
   StreamWindow window_{};
-  int16_t* area_ = nullptr;
+  int16_t area_[10 * 64] = {};
   int16_t* ptrs_[10] = {};
 };
 
