@@ -41,10 +41,12 @@ inline void vj_idct_1x1(const uint8_t* centre, const uint32_t* mult, const int16
 IdctRoutine VETAJ_DoIdct_4x4;
 IdctRoutine VETAJ_DoIdct_2x2;
 IdctRoutine VETAJ_DoIdct_1x1;
-// VETAJ_DoIdct_4x4 and VETAJ_DoIdct_2x2 for a block whose coefficients end
-// by zig-zag position 18 and 4 respectively (as the 1/2 and 1/4 decoders
-// leave them): the same output, reading less.
+// VETAJ_DoIdct_4x4 for a block whose coefficients end by zig-zag position
+// 18 (as the 1/2 decoder leaves them) or 5, and VETAJ_DoIdct_2x2 for one
+// that ends by position 4 (as the 1/4 decoder leaves it): the same output,
+// reading less.
 IdctRoutine vj_idct_4x4_low;
+IdctRoutine vj_idct_4x4_lower;
 IdctRoutine vj_idct_2x2_low;
 // Rectangular sizes of the per-component scaled mode.
 IdctRoutine VETAJ_DoIdct_8x4;

@@ -70,19 +70,19 @@ using namespace vj::idct;
 namespace {
 
 // The 4x4 transform reads rows and columns 0..3 and 5..7. A block whose
-// coefficients end by zig-zag position 18 (as the 1/2 decoder leaves them)
-// has nothing in rows 5..7 or columns 6 and 7: kLow reads only the rest and
-// takes those as zero.
-template <bool kLow>
+// coefficients all lie in rows 0..kMaxRow and columns 0..kMaxCol is
+// transformed reading only those, the rest taken as zero: zig-zag positions
+// up to 18 (all the 1/2 decoder keeps) lie in rows 0..4 and columns 0..5,
+// positions up to 5 in rows and columns 0..2.
+template <int kMaxCol, int kMaxRow>
 inline void idct_4x4(const uint8_t* centre, const uint32_t* mult, const int16_t* coef,
                      uint8_t** rows, uint32_t col) {
   w32 ws[4][8];  // column 4 is not used
-  constexpr int kColumns = kLow ? 6 : 8;
-  for (int c = 0; c < kColumns; ++c) {
+  for (int c = 0; c <= kMaxCol; ++c) {
     if (c == 4) continue;
-    auto q = [&](int r) -> int32_t { return kLow && r > 4 ? 0 : coef[8 * r + c]; };
+    auto q = [&](int r) -> int32_t { return r > kMaxRow ? 0 : coef[8 * r + c]; };
     auto d = [&](int r) -> w32 {
-      return kLow && r > 4 ? 0 : dequant(coef[8 * r + c], mult[8 * r + c]);
+      return r > kMaxRow ? 0 : dequant(coef[8 * r + c], mult[8 * r + c]);
     };
     if ((q(1) | q(2) | q(3) | q(5) | q(6) | q(7)) == 0) {
       const w32 dc = d(0) << 2;
@@ -99,11 +99,9 @@ inline void idct_4x4(const uint8_t* centre, const uint32_t* mult, const int16_t*
   // 10 bits kept of ((w0 << 14) + (1 << 18)) >> 19 are those of
   // (w0 + 16) >> 5.
   for (int r = 0; r < 4; ++r) {
-    const w32* w = ws[r];
-    const w32 w6 = kLow ? 0 : w[6];
-    const w32 w7 = kLow ? 0 : w[7];
+    auto w = [&](int c) -> w32 { return c > kMaxCol ? 0 : ws[r][c]; };
     uint8_t* out = rows[r] + col;
-    const Out4 o = kernel4x4((w[0] << 14) + (1u << 18), w[1], w[2], w[3], w[5], w6, w7);
+    const Out4 o = kernel4x4((w(0) << 14) + (1u << 18), w(1), w(2), w(3), w(5), w(6), w(7));
     out[0] = sample(centre, o.v0, 19);
     out[1] = sample(centre, o.v1, 19);
     out[2] = sample(centre, o.v2, 19);
@@ -115,12 +113,17 @@ inline void idct_4x4(const uint8_t* centre, const uint32_t* mult, const int16_t*
 
 void VETAJ_DoIdct_4x4(const uint8_t* centre, const uint32_t* mult, const int16_t* coef,
                       uint8_t** rows, uint32_t col) {
-  idct_4x4<false>(centre, mult, coef, rows, col);
+  idct_4x4<7, 7>(centre, mult, coef, rows, col);
 }
 
 void vj_idct_4x4_low(const uint8_t* centre, const uint32_t* mult, const int16_t* coef,
                      uint8_t** rows, uint32_t col) {
-  idct_4x4<true>(centre, mult, coef, rows, col);
+  idct_4x4<5, 4>(centre, mult, coef, rows, col);
+}
+
+void vj_idct_4x4_lower(const uint8_t* centre, const uint32_t* mult, const int16_t* coef,
+                       uint8_t** rows, uint32_t col) {
+  idct_4x4<2, 2>(centre, mult, coef, rows, col);
 }
 
 namespace {
