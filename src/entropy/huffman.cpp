@@ -25,7 +25,7 @@ namespace {
 
 // Fills `t` from `src`. Returns false for an invalid table.
 bool build_derived(DerivedHuffTable* t, const HuffTable* src) {
-  AcFastTables* fast = t->fast;  // kept across a rebuild in place
+  FastTables* fast = t->fast;  // kept across a rebuild in place
   KOLVAVETA_OsMemset(t, 0, sizeof(*t));
   t->fast = fast;
   t->source = src;
@@ -155,11 +155,11 @@ int32_t prepare(DecoderInfo* d, int32_t is_dc, int32_t table_no, DerivedHuffTabl
     *slot = t;
   }
   if (!build_derived(t, src)) return vj::kStatusFail;
-  if (!is_dc && !progressive) {
-    if (t->fast == nullptr) t->fast = vj::alloc_zeroed<AcFastTables>();
+  if (!progressive) {
+    if (t->fast == nullptr) t->fast = vj::alloc_zeroed<FastTables>();
     if (t->fast == nullptr) return vj::kStatusFail;
     build_fast_coefficients(t->fast->coef, t);
-    build_skip_entries<kWideSkipBits, kWideSkipAdvanceShift>(t->fast->skip, t);
+    if (!is_dc) build_skip_entries<kWideSkipBits, kWideSkipAdvanceShift>(t->fast->skip, t);
   }
   if (is_dc) {
     uint32_t n = 0;

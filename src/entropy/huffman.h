@@ -15,7 +15,7 @@ constexpr int kLookaheadBits = 8;
 // Lookahead entry of a code longer than 8 bits: length 9, symbol 0.
 constexpr uint32_t kLongCode = 0x900;
 
-struct AcFastTables;
+struct FastTables;
 
 // Decoding table built from a HuffTable.
 struct DerivedHuffTable {
@@ -23,11 +23,12 @@ struct DerivedHuffTable {
   int32_t valoffset[17];   // [l]: index of the first symbol of length l minus its code
   const HuffTable* source; // symbol values are read through it
   uint32_t lookahead[256]; // next 8 bits -> (length << 8) | symbol, or kLongCode
-  AcFastTables* fast;      // wider tables of baseline AC tables (owned), or null
+  FastTables* fast;        // wider tables of baseline tables (owned), or null
 };
 
-// Wider lookups of a baseline AC table, used where the window is known to
-// hold the bits:
+// Wider lookups of a baseline table, used where the window is known to hold
+// the bits (skip entries for AC tables only; a DC table's coef entries give
+// the difference's size as the symbol, with run 0):
 // - coef: next 10 bits -> one whole symbol when its code and magnitude
 //   fit: (value << 16) | (run << 8) | bits taken, value 0 for an end of
 //   block (run below 15) or a run of 16 zeros (run 15); 0 otherwise;
@@ -37,7 +38,7 @@ struct DerivedHuffTable {
 constexpr int kFastCoefBits = 10;
 constexpr int kWideSkipBits = 13;
 constexpr int kWideSkipAdvanceShift = 6;
-struct AcFastTables {
+struct FastTables {
   int32_t coef[1 << kFastCoefBits];
   uint16_t skip[1 << kWideSkipBits];
 };

@@ -339,9 +339,16 @@ VJ_ALWAYS_INLINE bool block_left(LeftBits& lb, R& r, const DerivedHuffTable* dct
                                  const DerivedHuffTable* act, int16_t* blk, int32_t* pred,
                                  int32_t* last_out) {
   lb.refill(r);
-  const int32_t s0 = symbol_left(lb, r, dct);
-  if (s0 < 0) return false;
-  *pred += s0 != 0 ? take_magnitude(lb, s0 & 15) : 0;
+  // The DC difference from one lookup when its code and magnitude fit.
+  const int32_t dc_entry = dct->fast->coef[lb.peek(kFastCoefBits)];
+  if (dc_entry != 0) {
+    lb.drop(static_cast<uint32_t>(dc_entry & 0xFF));
+    *pred += dc_entry >> 16;
+  } else {
+    const int32_t s0 = symbol_left(lb, r, dct);
+    if (s0 < 0) return false;
+    *pred += s0 != 0 ? take_magnitude(lb, s0 & 15) : 0;
+  }
   if constexpr (kStore) blk[0] = static_cast<int16_t>(*pred);
   int32_t last = 0;
   int32_t k = 1;
@@ -461,7 +468,9 @@ bool run_mcu(BitReader<Fetch>& r, DecoderInfo* d, int16_t** blocks, bool* dc_out
     bool wide = true;
     for (uint32_t b = 0; b < nb; ++b) {
       const DerivedHuffTable* act = e->block_ac[b];
-      wide = wide && e->block_dc[b] != nullptr && act != nullptr && act->fast != nullptr;
+      const DerivedHuffTable* dct = e->block_dc[b];
+      wide = wide && dct != nullptr && dct->fast != nullptr && act != nullptr &&
+             act->fast != nullptr;
     }
     if (wide) {
       if (!run_mcu_left<kLastStored, kKeep, kDcCheck>(r, d, blocks, pred, dc_out_of_range))
