@@ -306,6 +306,10 @@ VJ_ALWAYS_INLINE bool skip_rest_left(LeftBits& lb, R& r, const DerivedHuffTable*
   return true;
 }
 
+// Bits one symbol can take from left-aligned bits: a code of at most 8 bits
+// (longer ones go through the bit reader) and 15 magnitude bits.
+constexpr int32_t kMaxSymbolBits = 8 + 15;
+
 // A magnitude of s bits taken from left-aligned bits, extended to its
 // signed value.
 VJ_ALWAYS_INLINE int32_t take_magnitude(LeftBits& lb, int32_t s) {
@@ -338,7 +342,7 @@ template <int kLastStored, bool kStore, class R>
 VJ_ALWAYS_INLINE bool block_left(LeftBits& lb, R& r, const DerivedHuffTable* dct,
                                  const DerivedHuffTable* act, int16_t* blk, int32_t* pred,
                                  int32_t* last_out) {
-  lb.refill(r);
+  if (lb.have < kMaxSymbolBits) lb.refill(r);
   // The DC difference from one lookup when its code and magnitude fit.
   const int32_t dc_entry = dct->fast->coef[lb.peek(kFastCoefBits)];
   if (dc_entry != 0) {
@@ -357,7 +361,7 @@ VJ_ALWAYS_INLINE bool block_left(LeftBits& lb, R& r, const DerivedHuffTable* dct
     // code and magnitude fit; other symbols are taken one by one.
     const int32_t* fast = act->fast->coef;
     for (; k < 64; ++k) {
-      lb.refill(r);
+      if (lb.have < kMaxSymbolBits) lb.refill(r);
       const int32_t fe = fast[lb.peek(kFastCoefBits)];
       int32_t v;
       if (fe != 0) {
