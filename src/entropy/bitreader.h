@@ -107,6 +107,8 @@ struct BitReader {
   uint32_t peek(int32_t n) const {
     return static_cast<uint32_t>(buf >> (bits - n)) & ((1u << n) - 1u);
   }
+  // Drops n bits looked at with peek.
+  void consume(int32_t n) { bits -= n; }
   uint32_t take(int32_t n) {
     bits -= n;
     return static_cast<uint32_t>(buf >> bits) & ((1u << n) - 1u);

@@ -62,87 +62,6 @@ enum class Keep {
   kNone,  // skip: only the DC predictor is kept up to date
 };
 
-template <class R>
-inline bool skip_ac(R& r, const DerivedHuffTable* act, const AcSkipTable* skip, int32_t k);
-
-// Decodes one block, storing coefficients at zig-zag positions up to
-// kLastStored. Past that position the rest of the block is stepped over with
-// the skip table when there is one. Returns false when the input ended.
-template <int kLastStored, class R>
-inline bool decode_block(R& r, const DerivedHuffTable* dct, const DerivedHuffTable* act,
-                         const AcSkipTable* skip, int16_t* blk, int32_t* pred,
-                         int32_t* last_out) {
-  int32_t s = r.decode(dct);
-  if (s < 0) return false;
-  int32_t diff = 0;
-  if (s != 0 && !r.receive(s, &diff)) return false;
-  *pred += diff;
-  blk[0] = static_cast<int16_t>(*pred);
-  *last_out = 0;
-  if constexpr (kLastStored == 0) {
-    if (skip != nullptr) return skip_ac(r, act, skip, 1);
-  }
-  int32_t last = 0;
-  // Where the window holds the bits, whole coefficients come from one
-  // lookup of the next 10 bits when their code and magnitude fit.
-  const int32_t* fast = nullptr;
-  if constexpr (R::kFast) {
-    if (act->fast != nullptr) fast = act->fast->coef;
-  }
-  for (int32_t k = 1; k < 64; ++k) {
-    if constexpr (R::kFast) {
-      if (fast != nullptr) {
-        r.prefetch8();
-        const int32_t fe = fast[r.peek(kFastCoefBits)];
-        if (fe != 0) {
-          r.bits -= fe & 0xFF;
-          const int32_t run = (fe >> 8) & 15;
-          if ((fe >> 16) == 0) {  // end of block, or 16 zeros
-            if (run != 15) break;
-            k += 15;
-            continue;
-          }
-          k += run;
-          if (kLastStored == 63 || k <= kLastStored) {
-            blk[VETAJ_NATURAL_ORDER[k]] = static_cast<int16_t>(fe >> 16);
-            last = k;
-            continue;
-          }
-          if (skip != nullptr) {
-            *last_out = last;
-            return skip_ac(r, act, skip, k + 1);
-          }
-          continue;
-        }
-      }
-    }
-    const int32_t rs = r.decode(act);
-    if (rs < 0) return false;
-    const int32_t run = rs >> 4;
-    s = rs & 15;
-    if (s != 0) {
-      k += run;
-      if (kLastStored == 63 || k <= kLastStored) {
-        int32_t v;
-        if (!r.receive(s, &v)) return false;
-        blk[VETAJ_NATURAL_ORDER[k]] = static_cast<int16_t>(v);
-        last = k;
-      } else {
-        if (!r.drop(s)) return false;
-        if (skip != nullptr) {
-          *last_out = last;
-          return skip_ac(r, act, skip, k + 1);
-        }
-      }
-    } else {
-      if (run != 15) break;
-      k += 15;
-    }
-  }
-  *last_out = last;
-  return true;
-}
-
 // What one skip-table lookup means at block position k.
 enum class SkipStep { kGoOn, kEnds, kByHand };
 
@@ -334,75 +253,6 @@ VJ_ALWAYS_INLINE int32_t symbol_left(LeftBits& lb, R& r, const DerivedHuffTable*
   return sym;
 }
 
-// One block on left-aligned bits (64-bit fast policy; the AC table has its
-// wide tables): the DC difference, the coefficients up to zig-zag position
-// kLastStored (stored when kStore), then the rest of the block stepped over
-// with the skip table. False when the input ended.
-template <int kLastStored, bool kStore, class R>
-VJ_ALWAYS_INLINE bool block_left(LeftBits& lb, R& r, const DerivedHuffTable* dct,
-                                 const DerivedHuffTable* act, int16_t* blk, int32_t* pred,
-                                 int32_t* last_out) {
-  if (lb.have < kMaxSymbolBits) lb.refill(r);
-  // The DC difference from one lookup when its code and magnitude fit.
-  const int32_t dc_entry = dct->fast->coef[lb.peek(kFastCoefBits)];
-  if (dc_entry != 0) {
-    lb.drop(static_cast<uint32_t>(dc_entry & 0xFF));
-    *pred += dc_entry >> 16;
-  } else {
-    const int32_t s0 = symbol_left(lb, r, dct);
-    if (s0 < 0) return false;
-    *pred += s0 != 0 ? take_magnitude(lb, s0 & 15) : 0;
-  }
-  if constexpr (kStore) blk[0] = static_cast<int16_t>(*pred);
-  int32_t last = 0;
-  int32_t k = 1;
-  if constexpr (kLastStored > 0) {
-    // Whole coefficients come from one lookup of the next 10 bits when their
-    // code and magnitude fit; other symbols are taken one by one.
-    const int32_t* fast = act->fast->coef;
-    for (; k < 64; ++k) {
-      if (lb.have < kMaxSymbolBits) lb.refill(r);
-      const int32_t fe = fast[lb.peek(kFastCoefBits)];
-      int32_t v;
-      if (fe != 0) {
-        lb.drop(static_cast<uint32_t>(fe & 0xFF));
-        const int32_t run = (fe >> 8) & 15;
-        v = fe >> 16;
-        if (v == 0) {  // end of block, or 16 zeros
-          if (run != 15) break;
-          k += 15;
-          continue;
-        }
-        k += run;
-      } else {
-        const int32_t rs = symbol_left(lb, r, act);
-        if (rs < 0) return false;
-        const int32_t run = rs >> 4;
-        const int32_t s = rs & 15;
-        if (s == 0) {
-          if (run != 15) break;  // end of block
-          k += 15;
-          continue;
-        }
-        k += run;
-        v = take_magnitude(lb, s);
-      }
-      if (kLastStored == 63 || k <= kLastStored) {
-        blk[VETAJ_NATURAL_ORDER[k]] = static_cast<int16_t>(v);
-        last = k;
-        continue;
-      }
-      ++k;  // past the kept range: the rest is skipped
-      *last_out = last;
-      return skip_rest_left(lb, r, act, act->fast->skip, k);
-    }
-    *last_out = last;
-    return true;
-  }
-  *last_out = last;
-  return skip_rest_left(lb, r, act, act->fast->skip, k);
-}
-
 // Steps over the AC data of one block with the skip table, several symbols
 // per lookup; ends exactly where a full decode of the block would.
 template <class R>
@@ -439,79 +289,182 @@ inline bool skip_ac(R& r, const DerivedHuffTable* act, const AcSkipTable* skip, 
   return true;
 }
 
-// The blocks of one MCU on left-aligned bits.
-template <int kLastStored, Keep kKeep, bool kDcCheck, class R>
-bool run_mcu_left(R& r, DecoderInfo* d, int16_t** blocks, int32_t* pred, bool* dc_bad) {
-  EntropyState* e = d->entropy;
-  const uint32_t nb = d->blocks_in_mcu;
+// The bit reader seen through left-aligned bits (64-bit fast policy, every
+// table of the MCU with its wide tables): the same operations as BitReader
+// for the block decoder, with the skip table always at hand.
+template <class R>
+struct LeftReader {
+  static constexpr bool kFast = true;
+  R& r;
   LeftBits lb;
-  lb.load(r);
+
+  explicit LeftReader(R& reader) : r(reader) { lb.load(r); }
+  void store() { lb.store(r); }
+  void prefetch8() {
+    if (lb.have < kMaxSymbolBits) lb.refill(r);
+  }
+  uint32_t peek(int32_t n) const { return lb.peek(n); }
+  void consume(int32_t n) { lb.drop(static_cast<uint32_t>(n)); }
+  int32_t decode(const DerivedHuffTable* t) { return symbol_left(lb, r, t); }
+  bool receive(int32_t s, int32_t* value) {
+    *value = take_magnitude(lb, s);
+    return true;
+  }
+  bool drop(int32_t s) {
+    lb.drop(static_cast<uint32_t>(s));
+    return true;
+  }
+};
+
+// Whether the rest of a block can be stepped over with a skip table, and
+// doing so.
+template <class F>
+inline bool can_skip(const BitReader<F>&, const AcSkipTable* skip) {
+  return skip != nullptr;
+}
+template <class R>
+inline bool can_skip(const LeftReader<R>&, const AcSkipTable*) {
+  return true;
+}
+template <class F>
+inline bool skip_rest(BitReader<F>& r, const DerivedHuffTable* act, const AcSkipTable* skip,
+                      int32_t k) {
+  return skip_ac(r, act, skip, k);
+}
+template <class R>
+VJ_ALWAYS_INLINE bool skip_rest(LeftReader<R>& src, const DerivedHuffTable* act,
+                                const AcSkipTable*, int32_t k) {
+  return skip_rest_left(src.lb, src.r, act, act->fast->skip, k);
+}
+
+// Decodes one block: the DC difference, then the coefficients up to zig-zag
+// position kLastStored (stored when kStore). Past that position the rest of
+// the block is stepped over with the skip table when there is one, else
+// decoded and dropped. Where the source holds the bits for it (kFast), a
+// whole coefficient or DC difference comes from one lookup of the next 10
+// bits when its code and magnitude fit. False when the input ended.
+template <int kLastStored, bool kStore, class Src>
+VJ_ALWAYS_INLINE bool decode_block(Src& src, const DerivedHuffTable* dct,
+                                   const DerivedHuffTable* act, const AcSkipTable* skip,
+                                   int16_t* blk, int32_t* pred, int32_t* last_out) {
+  *last_out = 0;
+  src.prefetch8();
+  int32_t dc_entry = 0;
+  if constexpr (Src::kFast) {
+    if (dct->fast != nullptr) dc_entry = dct->fast->coef[src.peek(kFastCoefBits)];
+  }
+  if (dc_entry != 0) {
+    src.consume(dc_entry & 0xFF);
+    *pred += dc_entry >> 16;
+  } else {
+    const int32_t s = src.decode(dct);
+    if (s < 0) return false;
+    int32_t diff = 0;
+    if (s != 0 && !src.receive(s, &diff)) return false;
+    *pred += diff;
+  }
+  if constexpr (kStore) blk[0] = static_cast<int16_t>(*pred);
+  const bool skipping = can_skip(src, skip);
+  if constexpr (kLastStored == 0) {
+    if (skipping) return skip_rest(src, act, skip, 1);
+  }
+  const int32_t* fast = nullptr;
+  if constexpr (Src::kFast) {
+    if (act->fast != nullptr) fast = act->fast->coef;
+  }
+  int32_t last = 0;
+  for (int32_t k = 1; k < 64; ++k) {
+    src.prefetch8();
+    const int32_t fe = fast != nullptr ? fast[src.peek(kFastCoefBits)] : 0;
+    int32_t v = 0;
+    int32_t run;
+    int32_t s = 0;
+    if (fe != 0) {
+      src.consume(fe & 0xFF);
+      run = (fe >> 8) & 15;
+      v = fe >> 16;
+      if (v == 0) {  // end of block, or 16 zeros
+        if (run != 15) break;
+        k += 15;
+        continue;
+      }
+    } else {
+      const int32_t rs = src.decode(act);
+      if (rs < 0) return false;
+      run = rs >> 4;
+      s = rs & 15;
+      if (s == 0) {
+        if (run != 15) break;  // end of block
+        k += 15;
+        continue;
+      }
+    }
+    k += run;
+    if (kLastStored == 63 || k <= kLastStored) {
+      if (s != 0 && !src.receive(s, &v)) return false;
+      if constexpr (kStore) blk[VETAJ_NATURAL_ORDER[k]] = static_cast<int16_t>(v);
+      last = k;
+      continue;
+    }
+    // Past the kept range.
+    if (s != 0 && !src.drop(s)) return false;
+    if (skipping) {
+      *last_out = last;
+      return skip_rest(src, act, skip, k + 1);
+    }
+  }
+  *last_out = last;
+  return true;
+}
+
+// The blocks of one MCU from one bit source.
+template <int kLastStored, Keep kKeep, bool kDcCheck, class Src>
+bool run_blocks(Src& src, DecoderInfo* d, int16_t** blocks, int32_t* pred, bool* dc_bad) {
+  constexpr bool kStore = kKeep == Keep::kAll;
+  const EntropyState* e = d->entropy;
+  const uint32_t nb = d->blocks_in_mcu;
   for (uint32_t b = 0; b < nb; ++b) {
+    const DerivedHuffTable* dct = e->block_dc[b];
+    const DerivedHuffTable* act = e->block_ac[b];
+    if (dct == nullptr || act == nullptr) return false;
     int32_t* p = &pred[d->mcu_membership[b] & 3];
-    constexpr bool kStore = kKeep == Keep::kAll;
+    const AcSkipTable* skip = !kStore || kLastStored < 63 ? e->block_skip[b] : nullptr;
     int32_t last;
-    if (!block_left<kStore ? kLastStored : 0, kStore>(lb, r, e->block_dc[b], e->block_ac[b],
-                                                       kStore ? blocks[b] : nullptr, p, &last))
+    if (!decode_block<kStore ? kLastStored : 0, kStore>(src, dct, act, skip,
+                                                         kStore ? blocks[b] : nullptr, p, &last))
       return false;
     if constexpr (kStore) d->last_nonzero[b] = last;
     if constexpr (kDcCheck) {
       if (*p < -2047 || *p > 2047) *dc_bad = true;
     }
   }
-  lb.store(r);
   return true;
 }
 
-// The blocks of one MCU on one fetch policy.
+// The blocks of one MCU on one fetch policy: on 64-bit hosts the fast
+// policy works on left-aligned bits when every table has its wide tables.
 template <int kLastStored, Keep kKeep, bool kDcCheck, class Fetch>
 bool run_mcu(BitReader<Fetch>& r, DecoderInfo* d, int16_t** blocks, bool* dc_out_of_range) {
   EntropyState* e = d->entropy;
   int32_t pred[4] = {e->last_dc[0], e->last_dc[1], e->last_dc[2], e->last_dc[3]};
-  const uint32_t nb = d->blocks_in_mcu;
+  bool left = false;
   if constexpr (Fetch::kFast && sizeof(typename Fetch::Word) == 8) {
-    bool wide = true;
-    for (uint32_t b = 0; b < nb; ++b) {
-      const DerivedHuffTable* act = e->block_ac[b];
+    left = true;
+    for (uint32_t b = 0; b < d->blocks_in_mcu; ++b) {
       const DerivedHuffTable* dct = e->block_dc[b];
-      wide = wide && dct != nullptr && dct->fast != nullptr && act != nullptr &&
+      const DerivedHuffTable* act = e->block_ac[b];
+      left = left && dct != nullptr && dct->fast != nullptr && act != nullptr &&
              act->fast != nullptr;
     }
-    if (wide) {
-      if (!run_mcu_left<kLastStored, kKeep, kDcCheck>(r, d, blocks, pred, dc_out_of_range))
+    if (left) {
+      LeftReader<BitReader<Fetch>> src(r);
+      if (!run_blocks<kLastStored, kKeep, kDcCheck>(src, d, blocks, pred, dc_out_of_range))
         return false;
-      for (int i = 0; i < 4; ++i) e->last_dc[i] = pred[i];
-      return true;
+      src.store();
     }
   }
-  for (uint32_t b = 0; b < nb; ++b) {
-    const DerivedHuffTable* dct = e->block_dc[b];
-    const DerivedHuffTable* act = e->block_ac[b];
-    if (dct == nullptr || act == nullptr) return false;
-    int32_t* p = &pred[d->mcu_membership[b] & 3];
-    if constexpr (kKeep == Keep::kNone) {
-      const AcSkipTable* skip = e->block_skip[b];
-      if (skip != nullptr) {
-        int32_t s = r.decode(dct);
-        if (s < 0) return false;
-        int32_t diff = 0;
-        if (s != 0 && !r.receive(s, &diff)) return false;
-        *p += diff;
-        if (!skip_ac(r, act, skip, 1)) return false;
-      } else {
-        // No skip table for this table: decode the block into scratch space.
-        alignas(16) int16_t scratch[64];
-        int32_t last;
-        if (!decode_block<0>(r, dct, act, nullptr, scratch, p, &last)) return false;
-      }
-    } else {
-      const AcSkipTable* skip = kLastStored < 63 ? e->block_skip[b] : nullptr;
-      if (!decode_block<kLastStored>(r, dct, act, skip, blocks[b], p, &d->last_nonzero[b]))
-        return false;
-      if constexpr (kDcCheck) {
-        if (*p < -2047 || *p > 2047) *dc_out_of_range = true;
-      }
-    }
-  }
+  if (!left && !run_blocks<kLastStored, kKeep, kDcCheck>(r, d, blocks, pred, dc_out_of_range))
+    return false;
   for (int i = 0; i < 4; ++i) e->last_dc[i] = pred[i];
   return true;
 }
