@@ -52,8 +52,8 @@ using vj::BitReader;
 using vj::CarefulFetch;
 using vj::FastFetch;
 
-// The skipping loops keep their bit state in registers only when inlined
-// into the block loop.
+// The block and skipping loops keep their bit state in registers only when
+// inlined into the MCU loop.
 #define VJ_ALWAYS_INLINE inline __attribute__((always_inline))
 
 // What a decoder keeps of each block.
@@ -117,7 +117,7 @@ inline bool skip_symbol(R& r, const DerivedHuffTable* act, int32_t* k, bool* ok)
   return true;
 }
 
-// Bit state of the skipping loops on 64-bit hosts. The next bits are held
+// Bit state of the fast policy on 64-bit hosts. The next bits are held
 // left-aligned in a 64-bit word, so that one lookup is a shift right, a load
 // and a shift left by the entry's bit count: the shortest chain from one
 // group of symbols to the next. A refill keeps at least 56 bits, enough for
