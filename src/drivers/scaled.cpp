@@ -122,6 +122,7 @@ struct ReducedSlots {  // the reduced table, indexed by min(last, 6)
   const DecoderInfo* d;
   VETAJ_IdctFn operator()(int32_t last) const {
     const VETAJ_IdctFn f = d->idct_slots[vj_reduced_slot(last)];
+    if (last < 0) return f;
     if (f == VETAJ_DoIdct_4x4 && last <= 18) return last <= 5 ? vj_idct_4x4_lower : vj_idct_4x4_low;
     return f == VETAJ_DoIdct_2x2 && last <= 4 ? vj_idct_2x2_low : f;
   }
