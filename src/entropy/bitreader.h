@@ -11,9 +11,11 @@
 //   supplies zero bits after it.
 // - FastFetch is used only when the window is known to hold every byte one
 //   MCU can possibly need, so it never tests for the end of the window. It
-//   takes two bytes per refill. When it meets a marker it supplies zeros and
-//   reports it; the caller then decodes that MCU again with CarefulFetch, so
-//   both policies always produce the same result.
+//   takes several bytes per refill. When it meets a marker it supplies zeros
+//   and reports it; the caller then decodes that MCU again with
+//   CarefulFetch, so both policies always produce the same result. On
+//   64-bit hosts the MCU decoders work on its state through a left-aligned
+//   64-bit word with the same byte rules.
 #ifndef VETAJ_ENTROPY_BITREADER_H
 #define VETAJ_ENTROPY_BITREADER_H
 
