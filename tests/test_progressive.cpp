@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "VetaJpegDecoder.h"
+#include "entropy/bitreader.h"
 #include "platform/common.h"
 #include "support/decoding.h"
 #include "support/files.h"
@@ -188,8 +189,9 @@ TEST(ProgressiveDecoding, MemoryStaysAtOneRowOfCoefficients) {
 }
 
 // Damaged progressive data: bad spectral bands, refinements without a first
-// pass, values overflowing 16 bits, truncation and bit flips never reach
-// outside the workspace (sanitizer builds) and fail only by result.
+// pass, values overflowing 16 bits, truncation, bit flips and stray end
+// markers never reach outside the workspace (sanitizer builds) and fail only
+// by result; the fast and careful fetch policies give the same result.
 TEST(ProgressiveDecoding, DamagedScansAreSurvived) {
   std::mt19937 rng(5);
   for (const auto& name : vjtest::list_fixtures(".jpg")) {
@@ -202,6 +204,10 @@ TEST(ProgressiveDecoding, DamagedScansAreSurvived) {
       for (int k = 0; k < 4; ++k)
         variants.back()[jpeg.size() / 4 + rng() % (jpeg.size() * 3 / 4)] ^= uint8_t(1u << (rng() % 8));
     }
+    for (size_t at = jpeg.size() / 3; at + 2 < jpeg.size(); at += jpeg.size() / 5) {
+      variants.push_back(jpeg);
+      variants.back()[at] = 0xFF, variants.back()[at + 1] = 0xD9;
+    }
     // Scan headers rewritten: Ss > Se, Al and Ah raised, components changed.
     for (const auto& sh : scan_headers(jpeg)) {
       const size_t params = sh.sos + 5 + 2 * size_t(jpeg[sh.sos + 4]);
@@ -211,8 +217,15 @@ TEST(ProgressiveDecoding, DamagedScansAreSurvived) {
       }
     }
     for (const auto& v : variants)
-      for (int shift = 0; shift <= 3; ++shift)
-        (void)decode(v, shift % 2 ? KOLVAVETA_FMT_RGB565 : KOLVAVETA_FMT_RGBA8888, 64 >> shift, 48 >> shift);
+      for (int shift = 0; shift <= 3; ++shift) {
+        const int format = shift % 2 ? KOLVAVETA_FMT_RGB565 : KOLVAVETA_FMT_RGBA8888;
+        const auto fast = decode(v, format, 64 >> shift, 48 >> shift);
+        vj::g_entropy_careful_only = true;
+        const auto careful = decode(v, format, 64 >> shift, 48 >> shift);
+        vj::g_entropy_careful_only = false;
+        ASSERT_EQ(fast.ok, careful.ok) << name;
+        ASSERT_EQ(fast.buffer, careful.buffer) << name;
+      }
   }
 }
 

@@ -1,17 +1,23 @@
-// Progressive MCU decoders on the exact (careful) refill rule; the end of
-// the input reads as zero bits, like data cut short by a marker.
+// Progressive MCU decoders. The end of the input reads as zero bits, like
+// data cut short by a marker. AC passes run on the fast fetch policy where
+// the window holds every byte a block can need, and again on the exact
+// (careful) refill rule after a marker, as the baseline decoders do.
 #include "entropy/progressive.h"
+
+#include <cstring>
 
 #include "entropy/bitreader.h"
 #include "entropy/mcu.h"
 
 namespace {
 
-using Reader = vj::BitReader<vj::CarefulFetch>;
+using Careful = vj::BitReader<vj::CarefulFetch>;
+using Fast = vj::BitReader<vj::FastFetch>;
 
 enum class Pass { kDcFirst, kDcRefine, kAcFirst, kAcRefine };
 
 // One coefficient block's worth of work of each pass.
+template <class Reader>
 bool dc_first(Reader& r, DecoderInfo* d, int16_t** blocks) {
   EntropyState* e = d->entropy;
   for (uint32_t b = 0; b < d->blocks_in_mcu; ++b) {
@@ -26,6 +32,7 @@ bool dc_first(Reader& r, DecoderInfo* d, int16_t** blocks) {
   return true;
 }
 
+template <class Reader>
 bool dc_refine(Reader& r, DecoderInfo* d, int16_t** blocks) {
   const int32_t p1 = 1 << d->Al;
   for (uint32_t b = 0; b < d->blocks_in_mcu; ++b) {
@@ -36,6 +43,7 @@ bool dc_refine(Reader& r, DecoderInfo* d, int16_t** blocks) {
   return true;
 }
 
+template <class Reader>
 bool ac_first(Reader& r, DecoderInfo* d, int16_t** blocks) {
   EntropyState* e = d->entropy;
   const uint32_t nb = d->blocks_in_mcu;
@@ -86,6 +94,7 @@ bool ac_first(Reader& r, DecoderInfo* d, int16_t** blocks) {
 }
 
 // Correction bit of an already non-zero coefficient.
+template <class Reader>
 inline bool refine_one(Reader& r, int16_t* coef, int32_t p1, int32_t m1) {
   uint32_t bit;
   if (!r.bit(&bit)) return false;
@@ -93,6 +102,7 @@ inline bool refine_one(Reader& r, int16_t* coef, int32_t p1, int32_t m1) {
   return true;
 }
 
+template <class Reader>
 bool ac_refine(Reader& r, DecoderInfo* d, int16_t** blocks) {
   EntropyState* e = d->entropy;
   const int32_t p1 = 1 << d->Al;
@@ -153,21 +163,45 @@ bool ac_refine(Reader& r, DecoderInfo* d, int16_t** blocks) {
   return true;
 }
 
+template <Pass kPass, class Reader>
+bool run_pass(Reader& r, DecoderInfo* d, int16_t** blocks) {
+  switch (kPass) {
+    case Pass::kDcFirst: return dc_first(r, d, blocks);
+    case Pass::kDcRefine: return dc_refine(r, d, blocks);
+    case Pass::kAcFirst: return ac_first(r, d, blocks);
+    default: return ac_refine(r, d, blocks);
+  }
+}
+
 template <Pass kPass>
 int32_t decode_prog_mcu(DecoderInfo* d, int16_t** blocks) {
   // A DC refinement reads its bits whatever the insufficient-data flag says.
   const int32_t early = vj::begin_mcu(d, kPass != Pass::kDcRefine);
   if (early >= 0) return early;
   EntropyState* e = d->entropy;
-  Reader r(d);
-  r.eof_as_marker = true;
-  bool ok;
-  switch (kPass) {
-    case Pass::kDcFirst: ok = dc_first(r, d, blocks); break;
-    case Pass::kDcRefine: ok = dc_refine(r, d, blocks); break;
-    case Pass::kAcFirst: ok = ac_first(r, d, blocks); break;
-    default: ok = ac_refine(r, d, blocks); break;
+  // AC scans hold one block per MCU: where the window holds all it can
+  // need, the fast policy decodes it; a marker met on the way sends the
+  // block back, as it was, to the careful policy.
+  if constexpr (kPass == Pass::kAcFirst || kPass == Pass::kAcRefine) {
+    const uint32_t margin = vj::fast_margin(1);
+    if (d->blocks_in_mcu == 1 && d->unread_marker == 0 && !vj::g_entropy_careful_only &&
+        (d->window->remaining >= margin || vj::entropy_top_up(d, margin) >= margin)) {
+      int16_t saved[64];
+      std::memcpy(saved, blocks[0], sizeof saved);
+      const uint32_t eob_run = d->eob_run;
+      Fast fast(d);
+      if (run_pass<kPass>(fast, d, blocks) && !fast.marker_seen) {
+        fast.store();
+        --e->restarts_to_go;
+        return 1;
+      }
+      std::memcpy(blocks[0], saved, sizeof saved);
+      d->eob_run = eob_run;
+    }
   }
+  Careful r(d);
+  r.eof_as_marker = true;
+  const bool ok = run_pass<kPass>(r, d, blocks);
   r.store();
   if (!ok) return 0;
   --e->restarts_to_go;
