@@ -11,6 +11,7 @@
 // other jobs spreads over all of them. --once (entropy) runs each side once
 // without warm-up, for instruction counting under callgrind. --side runs one
 // side only, e.g. to count its cycles with perf stat on a busy machine.
+#include <jpeglib.h>
 #include <malloc.h>
 #include <time.h>
 
@@ -25,8 +26,6 @@
 #include <string>
 #include <utility>
 #include <vector>
-
-#include <jpeglib.h>
 
 #include "VetaJpegDecoder.h"
 #include "drivers/decoder.h"
@@ -111,8 +110,8 @@ bool load_file(const std::string& path, JpegFile* file) {
   const long size = std::ftell(f);
   std::fseek(f, 0, SEEK_SET);
   file->data.resize(size > 0 ? static_cast<size_t>(size) : 0);
-  const bool ok = size > 0 && std::fread(file->data.data(), 1, file->data.size(), f) ==
-                                  file->data.size();
+  const bool ok =
+      size > 0 && std::fread(file->data.data(), 1, file->data.size(), f) == file->data.size();
   std::fclose(f);
   if (!ok) {
     std::fprintf(stderr, "cannot read %s\n", path.c_str());
@@ -228,9 +227,9 @@ double vetaj_decode(const JpegFile& file, Format format, int scale, uint8_t* out
   if (KOLVAVETA_DecodeJPEG == nullptr) return -1.0;
   const int32_t code = format == Format::kRgba ? KOLVAVETA_FMT_RGBA8888 : KOLVAVETA_FMT_RGB565;
   const double t0 = now_seconds();
-  DecInfo* obj = KOLVAVETA_CreateDecInfo(KOLVAVETA_IO_MEMORY, const_cast<uint8_t*>(file.data.data()),
-                                         static_cast<uint32_t>(file.data.size()), code,
-                                         KOLVAVETA_OPT_THUMB_NEVER);
+  DecInfo* obj = KOLVAVETA_CreateDecInfo(
+      KOLVAVETA_IO_MEMORY, const_cast<uint8_t*>(file.data.data()),
+      static_cast<uint32_t>(file.data.size()), code, KOLVAVETA_OPT_THUMB_NEVER);
   if (obj == nullptr) return -1.0;
   const int32_t ok = KOLVAVETA_DecodeJPEG(obj, out, file.width / scale, file.height / scale);
   const double t1 = now_seconds();
@@ -349,8 +348,7 @@ int run_entropy(const JpegFile& file, int runs, bool once, Side side) {
   const size_t bytes = first_scan_bytes(file.data);
   if (once) {
     // Read by callgrind.sh.
-    std::printf("entropy-once file=%s mcus=%u entropy_bytes=%zu\n", file.name.c_str(), mcus,
-                bytes);
+    std::printf("entropy-once file=%s mcus=%u entropy_bytes=%zu\n", file.name.c_str(), mcus, bytes);
     return *std::min_element(seconds.begin(), seconds.end()) < 0.0 ? 1 : 0;
   }
   std::printf("entropy %s: %dx%d, %u MCUs, %zu entropy-coded bytes\n", file.name.c_str(),
@@ -380,7 +378,9 @@ void run_decode(const JpegFile& file, Format format, int scale, int runs, Side s
   const std::vector<Contender> contenders = {
       [&] { return vetaj ? vetaj_decode(file, format, scale, out) : -1.0; },
       [&] { return turbo ? turbo_decode(file, format, scale, true, out, capacity, stride) : -1.0; },
-      [&] { return turbo ? turbo_decode(file, format, scale, false, out, capacity, stride) : -1.0; },
+      [&] {
+        return turbo ? turbo_decode(file, format, scale, false, out, capacity, stride) : -1.0;
+      },
   };
   const std::vector<double> m = measure(contenders, runs);
   const double mpix = static_cast<double>(file.width) * file.height * 1e-6;
@@ -391,7 +391,9 @@ void run_decode(const JpegFile& file, Format format, int scale, int runs, Side s
     if (m[i] < 0.0) {
       const bool ran = i == 0 ? vetaj : turbo;
       std::snprintf(cells[i], sizeof cells[i], "%s",
-                    !ran ? "-" : i == 0 ? "unsupported" : "failed");
+                    !ran     ? "-"
+                    : i == 0 ? "unsupported"
+                             : "failed");
     } else {
       std::snprintf(cells[i], sizeof cells[i], "%.1f", mpix / m[i]);
     }
@@ -404,8 +406,8 @@ void run_decode(const JpegFile& file, Format format, int scale, int runs, Side s
       std::snprintf(ratios[i], sizeof ratios[i], "%.2f", m[i + 1] / m[0]);
     }
   }
-  std::printf("%-22s %-13s %13s %13s %6s %13s %6s\n", file.name.c_str(), output, cells[0],
-              cells[1], ratios[0], cells[2], ratios[1]);
+  std::printf("%-22s %-13s %13s %13s %6s %13s %6s\n", file.name.c_str(), output, cells[0], cells[1],
+              ratios[0], cells[2], ratios[1]);
   std::fflush(stdout);
 }
 
@@ -504,8 +506,8 @@ int main(int argc, char** argv) {
     } else if (a == "--once") {
       once = true;
     } else if (a == "--side" && has_value) {
-      if (!pick(argv[++i], {{"vetaj", Side::kVetaj}, {"libjpeg", Side::kTurbo},
-                            {"both", Side::kBoth}}, &side))
+      if (!pick(argv[++i],
+                {{"vetaj", Side::kVetaj}, {"libjpeg", Side::kTurbo}, {"both", Side::kBoth}}, &side))
         return usage();
     } else if (a == "--format" && has_value) {
       if (!pick(argv[++i], {{"rgba", Format::kRgba}, {"rgb565", Format::kRgb565}}, &format))

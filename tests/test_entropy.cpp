@@ -32,7 +32,9 @@ HuffTable luma_dc() {
 }
 // An AC table: 00 end of block, 01 (0,1), 100 sixteen zeros, 1010 (2,2), and
 // two 10-bit codes.
-HuffTable test_ac() { return table({{2, 2}, {3, 1}, {4, 1}, {10, 2}}, {0x00, 0x01, 0xF0, 0x22, 0x13, 0x31}); }
+HuffTable test_ac() {
+  return table({{2, 2}, {3, 1}, {4, 1}, {10, 2}}, {0x00, 0x01, 0xF0, 0x22, 0x13, 0x31});
+}
 
 // A decoder record as the marker parser leaves it (the first component
 // sampled as given, every table defined), freed as the decoder frees it.
@@ -62,7 +64,8 @@ struct Frame {
   }
   ~Frame() { VETAJ_DeleteDecoderInfo(&d); }
   int32_t prepare(int is_dc, int number, DerivedHuffTable** t, bool progressive = false) {
-    return (progressive ? VETAJ_P_PrepareDerivedTbl : VETAJ_PrepareDerivedTbl)(&d, is_dc, number, t, d.entropy);
+    return (progressive ? VETAJ_P_PrepareDerivedTbl : VETAJ_PrepareDerivedTbl)(&d, is_dc, number, t,
+                                                                               d.entropy);
   }
 };
 
@@ -333,7 +336,7 @@ TEST(RestartMarkers, RestartSearchCountsDiscardedBytes) {
   EXPECT_EQ(in.m.next_restart, 1);
   EXPECT_EQ(in.e.last_dc[0] | in.e.last_dc[1] | in.e.insufficient, 0);
   EXPECT_EQ(in.e.restarts_to_go, 4u);
-  EXPECT_EQ(in.w.remaining, 1u);  // cursor right after the marker
+  EXPECT_EQ(in.w.remaining, 1u);                    // cursor right after the marker
   EXPECT_EQ(VETAJ_ProcessRestartMarker(&in.d), 0);  // end of input while searching
 }
 
@@ -376,7 +379,8 @@ TEST(BaselineDecoding, DataCutByEoiReadsZeroBitsWithTheFlagSet) {
     h.d()->entropy->restarts_to_go = 9;
     ASSERT_EQ(VETAJ_DecodeMcu(h.d(), h.blocks()), 1);
     EXPECT_EQ(h.d()->entropy->restarts_to_go, 8u);
-    for (int i = 0; i < 64 * h.d()->blocks_in_mcu; ++i) ASSERT_EQ(h.blocks()[0][i], 0) << "MCU " << m;
+    for (int i = 0; i < 64 * h.d()->blocks_in_mcu; ++i)
+      ASSERT_EQ(h.blocks()[0][i], 0) << "MCU " << m;
   }
 }
 
@@ -384,9 +388,10 @@ TEST(BaselineDecoding, DataCutByEoiReadsZeroBitsWithTheFlagSet) {
 // reading outside the input or writing outside the blocks (sanitizers).
 TEST(BaselineDecoding, CorruptAndTruncatedDataIsSurvived) {
   std::mt19937 rng(1234);
-  for (const char* name : {"base_420_q75_64x48.jpg", "base_422_rst2_q80_63x65.jpg", "base_444_rst3_q85_48x40.jpg",
-                           "base_420_opt_rst4_q92_63x65.jpg", "base_mixed_y22_cb21_cr12_q95_50x38.jpg",
-                           "base_420_rst2_q85_192x144.jpg"}) {
+  for (const char* name :
+       {"base_420_q75_64x48.jpg", "base_422_rst2_q80_63x65.jpg", "base_444_rst3_q85_48x40.jpg",
+        "base_420_opt_rst4_q92_63x65.jpg", "base_mixed_y22_cb21_cr12_q95_50x38.jpg",
+        "base_420_rst2_q85_192x144.jpg"}) {
     const auto jpeg = vjtest::read_fixture(name);
     const auto l = layout_of(jpeg);
     ASSERT_GT(l.start, 0u) << name;
@@ -395,7 +400,8 @@ TEST(BaselineDecoding, CorruptAndTruncatedDataIsSurvived) {
       variants.emplace_back(jpeg.begin(), jpeg.begin() + long(cut));
     for (int i = 0; i < 24; ++i) {
       auto v = jpeg;
-      for (int k = 0; k < 1 + i % 5; ++k) v[l.start + rng() % (jpeg.size() - l.start)] ^= uint8_t(1u << (rng() % 8));
+      for (int k = 0; k < 1 + i % 5; ++k)
+        v[l.start + rng() % (jpeg.size() - l.start)] ^= uint8_t(1u << (rng() % 8));
       variants.push_back(v);
     }
     for (size_t at = l.start; at + 2 < jpeg.size(); at += 1 + (jpeg.size() - l.start) / 16) {
@@ -404,7 +410,8 @@ TEST(BaselineDecoding, CorruptAndTruncatedDataIsSurvived) {
       variants.back()[at + 1] = 0xD9;
     }
     variants.push_back(jpeg);
-    std::fill(variants.back().begin() + long(l.start), variants.back().begin() + long(std::min(jpeg.size(), l.start + 300)), 0xFF);
+    std::fill(variants.back().begin() + long(l.start),
+              variants.back().begin() + long(std::min(jpeg.size(), l.start + 300)), 0xFF);
     // Every decoder in turn, on both fetch policies: the fast policy hands
     // an MCU that meets a marker to the careful one, so both must give the
     // same results, coefficients and end state even on damaged data.
@@ -418,13 +425,27 @@ TEST(BaselineDecoding, CorruptAndTruncatedDataIsSurvived) {
         for (uint32_t m = 0; m < h.total_mcus(); ++m) {
           h.at(m);
           switch (m % 7) {
-            case 0: out.push_back(VETAJ_DecodeMcu(h.d(), h.blocks())); break;
-            case 1: out.push_back(VETAJ_SkipMcu(h.d())); break;
-            case 2: out.push_back(VETAJ_DecodeMcu_8to1(h.d(), h.blocks())); break;
-            case 3: out.push_back(VETAJ_DecodeMcu_2to1(h.d(), h.blocks())); break;
-            case 4: out.push_back(VETAJ_DecodeMcu_4to1(h.d(), h.blocks())); break;
-            case 5: out.push_back(VETAJ_DecodeMcu_8to3(h.d(), h.blocks())); break;
-            default: out.push_back(VETAJ_FastDecodeMcu(h.d(), h.blocks())); break;
+            case 0:
+              out.push_back(VETAJ_DecodeMcu(h.d(), h.blocks()));
+              break;
+            case 1:
+              out.push_back(VETAJ_SkipMcu(h.d()));
+              break;
+            case 2:
+              out.push_back(VETAJ_DecodeMcu_8to1(h.d(), h.blocks()));
+              break;
+            case 3:
+              out.push_back(VETAJ_DecodeMcu_2to1(h.d(), h.blocks()));
+              break;
+            case 4:
+              out.push_back(VETAJ_DecodeMcu_4to1(h.d(), h.blocks()));
+              break;
+            case 5:
+              out.push_back(VETAJ_DecodeMcu_8to3(h.d(), h.blocks()));
+              break;
+            default:
+              out.push_back(VETAJ_FastDecodeMcu(h.d(), h.blocks()));
+              break;
           }
           if (m % 7 == 1) continue;
           for (uint32_t b = 0; b < h.d()->blocks_in_mcu; ++b) {

@@ -387,8 +387,8 @@ struct Routine {
   VETAJ_IdctFn fn;
   int w, h;
   Samples (*ref)(const Block&);  // null: checked against libjpeg instead
-  uint64_t used;  // bit 8r+c: coefficient read
-  bool aan;       // takes AAN multipliers
+  uint64_t used;                 // bit 8r+c: coefficient read
+  bool aan;                      // takes AAN multipliers
 };
 
 constexpr uint64_t box(std::initializer_list<int> rows, std::initializer_list<int> cols) {
@@ -547,8 +547,10 @@ TEST(Idct, FullAndReducedSizesAreBitIdenticalToLibjpeg) {
     VETAJ_IdctFn fn;
     JpegIdct* lib;
     int n;
-  } sizes[] = {{VETAJ_DoIdct_islow, jpeg_idct_islow, 8}, {VETAJ_DoIdct_4x4, jpeg_idct_4x4, 4},
-               {VETAJ_DoIdct_2x2, jpeg_idct_2x2, 2}, {VETAJ_DoIdct_1x1, jpeg_idct_1x1, 1}};
+  } sizes[] = {{VETAJ_DoIdct_islow, jpeg_idct_islow, 8},
+               {VETAJ_DoIdct_4x4, jpeg_idct_4x4, 4},
+               {VETAJ_DoIdct_2x2, jpeg_idct_2x2, 2},
+               {VETAJ_DoIdct_1x1, jpeg_idct_1x1, 1}};
   jpeg_decompress_struct cinfo;
   std::memset(&cinfo, 0, sizeof cinfo);
   uint8_t table[kRangeLimitBytes];

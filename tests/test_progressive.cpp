@@ -22,8 +22,11 @@ namespace {
 using vjtest::Bytes;
 
 vjtest::Decoded decode(const Bytes& jpeg, int format, int width, int height) {
-  return vjtest::decode_bytes(jpeg, {.format = format, .width = width, .height = height,
-                                     .options = KOLVAVETA_OPT_THUMB_NEVER | KOLVAVETA_OPT_FIT_STRETCH});
+  return vjtest::decode_bytes(jpeg,
+                              {.format = format,
+                               .width = width,
+                               .height = height,
+                               .options = KOLVAVETA_OPT_THUMB_NEVER | KOLVAVETA_OPT_FIT_STRETCH});
 }
 
 // Scan headers of a stream: offset of the SOS marker, Ss, Se and the frame
@@ -87,7 +90,9 @@ std::vector<std::string> progressive_fixtures() {
 }
 
 vjtest::ColourAt ycc_samples(const vjtest::OraclePlanes& p) {
-  return [&p](int x, int y) { return vjtest::Colour{true, p.at(x, y, 0), p.at(x, y, 1), p.at(x, y, 2)}; };
+  return [&p](int x, int y) {
+    return vjtest::Colour{true, p.at(x, y, 0), p.at(x, y, 1), p.at(x, y, 2)};
+  };
 }
 
 class Progressive : public ::testing::TestWithParam<std::string> {};
@@ -107,14 +112,17 @@ TEST_P(Progressive, FollowsTheScansKeptAtEveryScale) {
     const int w = h.width >> shift, hh = h.height >> shift;
     if (w < 2 || hh < 2) continue;
     const bool dc_first = scans[0].ss == 0 && int(scans[0].comps.size()) == h.num_components;
-    const size_t kept = shift == 3 && dc_first ? 1 : scans_kept(scans, limits[shift], h.num_components);
+    const size_t kept =
+        shift == 3 && dc_first ? 1 : scans_kept(scans, limits[shift], h.num_components);
     vjtest::OraclePlanes ref;
     ASSERT_TRUE(vjtest::oracle_planes(first_scans(jpeg, kept), 1 << shift, &ref));
     const auto d = decode(jpeg, KOLVAVETA_FMT_YUV420, w, hh);
     ASSERT_EQ(d.ok, 1) << shift;
-    EXPECT_TRUE(vjtest::same_luma(d.buffer, w, hh, ref)) << "1/" << (1 << shift) << ", " << kept << " scans";
+    EXPECT_TRUE(vjtest::same_luma(d.buffer, w, hh, ref))
+        << "1/" << (1 << shift) << ", " << kept << " scans";
     if (shift == 0 && h.jpeg_color_space == 3) {  // full size keeps the chroma samples too
-      EXPECT_TRUE(vjtest::shows(d, vjtest::Placement::centred(KOLVAVETA_FMT_YUV420, w, hh, w, hh), ycc_samples(ref)));
+      EXPECT_TRUE(vjtest::shows(d, vjtest::Placement::centred(KOLVAVETA_FMT_YUV420, w, hh, w, hh),
+                                ycc_samples(ref)));
     }
   }
 }
@@ -142,8 +150,10 @@ TEST(ProgressiveDecoding, SequentialFramesWithOneScanPerComponent) {
     vjtest::OraclePlanes p;
     ASSERT_TRUE(vjtest::oracle_planes(jpeg, 1, &p));
     const auto d = decode(jpeg, KOLVAVETA_FMT_RGBA8888, p.width, p.height);
-    EXPECT_TRUE(vjtest::shows(d, vjtest::Placement::centred(KOLVAVETA_FMT_RGBA8888, p.width, p.height, p.width, p.height),
-                              ycc_samples(p))) << name;
+    EXPECT_TRUE(vjtest::shows(
+        d, vjtest::Placement::centred(KOLVAVETA_FMT_RGBA8888, p.width, p.height, p.width, p.height),
+        ycc_samples(p)))
+        << name;
   }
 }
 
@@ -159,9 +169,9 @@ TEST(ProgressiveDecoding, CallerStreamDecodesLikeMemory) {
     for (bool rewind : {true, false}) {
       src.pos = 0;
       DecInfo* o = KOLVAVETA_CreateDecInfoWithStream(
-          &src, uint32_t(src.data.size()), vjtest::CallbackSource::read, vjtest::CallbackSource::skip,
-          rewind ? vjtest::CallbackSource::rewind : nullptr, KOLVAVETA_FMT_RGBA8888,
-          KOLVAVETA_OPT_THUMB_NEVER | KOLVAVETA_OPT_FIT_STRETCH);
+          &src, uint32_t(src.data.size()), vjtest::CallbackSource::read,
+          vjtest::CallbackSource::skip, rewind ? vjtest::CallbackSource::rewind : nullptr,
+          KOLVAVETA_FMT_RGBA8888, KOLVAVETA_OPT_THUMB_NEVER | KOLVAVETA_OPT_FIT_STRETCH);
       ASSERT_NE(o, nullptr);
       for (int pass = 0; pass < 2; ++pass) {
         std::vector<uint8_t> buf(mem.buffer.size(), vjtest::kFill);
@@ -198,11 +208,13 @@ TEST(ProgressiveDecoding, DamagedScansAreSurvived) {
     const auto jpeg = vjtest::read_fixture(name);
     if (name.rfind("prog_", 0) != 0 || jpeg.size() > 20000) continue;
     std::vector<Bytes> variants;
-    for (int i = 1; i < 8; ++i) variants.emplace_back(jpeg.begin(), jpeg.begin() + long(jpeg.size() * i / 8));
+    for (int i = 1; i < 8; ++i)
+      variants.emplace_back(jpeg.begin(), jpeg.begin() + long(jpeg.size() * i / 8));
     for (int i = 0; i < 6; ++i) {
       variants.push_back(jpeg);
       for (int k = 0; k < 4; ++k)
-        variants.back()[jpeg.size() / 4 + rng() % (jpeg.size() * 3 / 4)] ^= uint8_t(1u << (rng() % 8));
+        variants.back()[jpeg.size() / 4 + rng() % (jpeg.size() * 3 / 4)] ^=
+            uint8_t(1u << (rng() % 8));
     }
     for (size_t at = jpeg.size() / 3; at + 2 < jpeg.size(); at += jpeg.size() / 5) {
       variants.push_back(jpeg);
@@ -211,9 +223,11 @@ TEST(ProgressiveDecoding, DamagedScansAreSurvived) {
     // Scan headers rewritten: Ss > Se, Al and Ah raised, components changed.
     for (const auto& sh : scan_headers(jpeg)) {
       const size_t params = sh.sos + 5 + 2 * size_t(jpeg[sh.sos + 4]);
-      for (const auto& edits : {std::vector<std::pair<int, int>>{{0, 40}, {1, 20}}, {{2, 0xDD}}, {{2, 0x0D}}}) {
+      for (const auto& edits :
+           {std::vector<std::pair<int, int>>{{0, 40}, {1, 20}}, {{2, 0xDD}}, {{2, 0x0D}}}) {
         variants.push_back(jpeg);
-        for (const auto& [offset, value] : edits) variants.back()[params + size_t(offset)] = uint8_t(value);
+        for (const auto& [offset, value] : edits)
+          variants.back()[params + size_t(offset)] = uint8_t(value);
       }
     }
     for (const auto& v : variants)

@@ -147,10 +147,10 @@ struct Selectors {  // index and method functions given by the caller
 struct BlockTarget {
   const uint8_t* centre;
   const uint32_t* mult;
-  uint8_t** rows;     // the component's first output row of the block
-  uint32_t x0;        // output column of the block in the MCU at column 0
-  uint32_t x_step;    // output columns per MCU
-  bool visible;       // inside the component's height (else only emptied)
+  uint8_t** rows;   // the component's first output row of the block
+  uint32_t x0;      // output column of the block in the MCU at column 0
+  uint32_t x_step;  // output columns per MCU
+  bool visible;     // inside the component's height (else only emptied)
 };
 
 // One iMCU row: decode each MCU with `decode`, transform each block into the
@@ -228,8 +228,10 @@ int32_t VETAJ_DecodeSingleiMcuResize8to1(DecoderInfo* d, uint8_t*** rows) {
 
 int32_t VETAJ_DecompressOnepass(DecoderInfo* d, uint8_t*** rows) {
   switch (d->scale_shift) {
-    case 1: return decode_rows(d, rows, d->decode_mcu_reduced, ReducedSlots{d}, 4);
-    case 2: return decode_rows(d, rows, d->decode_mcu_reduced, ReducedSlots{d}, 2);
+    case 1:
+      return decode_rows(d, rows, d->decode_mcu_reduced, ReducedSlots{d}, 4);
+    case 2:
+      return decode_rows(d, rows, d->decode_mcu_reduced, ReducedSlots{d}, 2);
     default:
       return decode_rows(d, rows, d->decode_mcu_reduced, DcSample{}, 1);
   }
@@ -341,16 +343,18 @@ int32_t VETAJ_DecodeSingleiMcu_resize(DecoderInfo* d, uint8_t*** rows) {
   const uint32_t s = d->scale_shift;
   if (s == 0) return vj::kStatusFail;
   if (d->scale_num == 3) {
-    return VETAJ_DecodeSingleiMcuResizeNto1(d, rows, VETAJ_DecodeMcu_8to3,
-                                            VETAJ_GetDctMethodIndexFirst,
-                                            VETAJ_GetDctMethod8to3, 3);
+    return VETAJ_DecodeSingleiMcuResizeNto1(
+        d, rows, VETAJ_DecodeMcu_8to3, VETAJ_GetDctMethodIndexFirst, VETAJ_GetDctMethod8to3, 3);
   }
   if (s <= 3) {
     if (d->fast_reduced) return VETAJ_DecompressOnepass(d, rows);
     switch (s) {
-      case 1: return VETAJ_DecodeSingleiMcuResize2to1(d, rows);
-      case 2: return VETAJ_DecodeSingleiMcuResize4to1(d, rows);
-      default: return VETAJ_DecodeSingleiMcuResize8to1(d, rows);
+      case 1:
+        return VETAJ_DecodeSingleiMcuResize2to1(d, rows);
+      case 2:
+        return VETAJ_DecodeSingleiMcuResize4to1(d, rows);
+      default:
+        return VETAJ_DecodeSingleiMcuResize8to1(d, rows);
     }
   }
   // Beyond 1/8: three-component baseline pictures at 1/16 average 2 x 2 MCUs.

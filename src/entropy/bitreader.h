@@ -79,8 +79,8 @@ struct BitReader {
   DecoderInfo* d;
   EntropyState* e;
   uint8_t insufficient;
-  bool marker_seen = false;  // FastFetch: a marker was met
-  bool eof_as_marker = false; // CarefulFetch: end of input reads as zero bits
+  bool marker_seen = false;    // FastFetch: a marker was met
+  bool eof_as_marker = false;  // CarefulFetch: end of input reads as zero bits
 
   explicit BitReader(DecoderInfo* dec)
       : buf(dec->entropy->bit_buffer),
@@ -134,7 +134,8 @@ struct BitReader {
       ++l;
     }
     if (l > 16) return 0;
-    return t->source->huffval[static_cast<uint32_t>(static_cast<int32_t>(code) + t->valoffset[l]) & 255u];
+    return t->source
+        ->huffval[static_cast<uint32_t>(static_cast<int32_t>(code) + t->valoffset[l]) & 255u];
   }
 
   // Decodes one Huffman symbol; -1 when the input ended.

@@ -8,16 +8,15 @@ extern "C" {
 // Zig-zag index -> natural (row-major) position, with 16 guard entries so
 // that a corrupt run carrying the position past 63 stays inside the block.
 const uint8_t VETAJ_NATURAL_ORDER[80] = {
-    0,  1,  8,  16, 9,  2,  3,  10, 17, 24, 32, 25, 18, 11, 4,  5,
-    12, 19, 26, 33, 40, 48, 41, 34, 27, 20, 13, 6,  7,  14, 21, 28,
-    35, 42, 49, 56, 57, 50, 43, 36, 29, 22, 15, 23, 30, 37, 44, 51,
-    58, 59, 52, 45, 38, 31, 39, 46, 53, 60, 61, 54, 47, 55, 62, 63,
-    63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63};
+    0,  1,  8,  16, 9,  2,  3,  10, 17, 24, 32, 25, 18, 11, 4,  5,  12, 19, 26, 33,
+    40, 48, 41, 34, 27, 20, 13, 6,  7,  14, 21, 28, 35, 42, 49, 56, 57, 50, 43, 36,
+    29, 22, 15, 23, 30, 37, 44, 51, 58, 59, 52, 45, 38, 31, 39, 46, 53, 60, 61, 54,
+    47, 55, 62, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63, 63};
 
 // A magnitude value v of s bits is negative when v < entry s.
-const int32_t VETAJ_HUFF_EXTEND_TEST[16] = {
-    0,     0x1,   0x2,   0x4,   0x8,   0x10,  0x20,   0x40,
-    0x80,  0x100, 0x200, 0x400, 0x800, 0x1000, 0x2000, 0x4000};
+const int32_t VETAJ_HUFF_EXTEND_TEST[16] = {0,     0x1,    0x2,    0x4,   0x8,   0x10,
+                                            0x20,  0x40,   0x80,   0x100, 0x200, 0x400,
+                                            0x800, 0x1000, 0x2000, 0x4000};
 
 }  // extern "C"
 
@@ -128,8 +127,8 @@ void build_fast_coefficients(int32_t* out, const DerivedHuffTable* t) {
     const uint32_t mag = (v >> (kFastCoefBits - len - s)) & ((1u << s) - 1);
     int32_t value = static_cast<int32_t>(mag);
     if (value < VETAJ_HUFF_EXTEND_TEST[s]) value += static_cast<int32_t>(1u - (1u << s));
-    out[v] = static_cast<int32_t>(static_cast<uint32_t>(value) << 16) | static_cast<int32_t>(r << 8) |
-             static_cast<int32_t>(len + s);
+    out[v] = static_cast<int32_t>(static_cast<uint32_t>(value) << 16) |
+             static_cast<int32_t>(r << 8) | static_cast<int32_t>(len + s);
   }
 }
 
@@ -171,8 +170,7 @@ int32_t prepare(DecoderInfo* d, int32_t is_dc, int32_t table_no, DerivedHuffTabl
   // Skip tables serve baseline frames only (the progressive builder is used
   // for progressive frames and so never makes one).
   const bool baseline = d->marker != nullptr && d->marker->frame_kind == kFrameBaseline;
-  if (progressive || entropy == nullptr || !baseline || !skipping_wanted(d))
-    return vj::kStatusOk;
+  if (progressive || entropy == nullptr || !baseline || !skipping_wanted(d)) return vj::kStatusOk;
   // The skip table follows its derived table: a table number redefined
   // between scans gets its skip table rebuilt too.
   AcSkipTable* skip = entropy->ac_skip[table_no];

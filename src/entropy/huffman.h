@@ -19,11 +19,11 @@ struct FastTables;
 
 // Decoding table built from a HuffTable.
 struct DerivedHuffTable {
-  int32_t maxcode[18];     // [l]: largest code of length l, -1 if none; [17] sentinel
-  int32_t valoffset[17];   // [l]: index of the first symbol of length l minus its code
-  const HuffTable* source; // symbol values are read through it
-  uint32_t lookahead[256]; // next 8 bits -> (length << 8) | symbol, or kLongCode
-  FastTables* fast;        // wider tables of baseline tables (owned), or null
+  int32_t maxcode[18];      // [l]: largest code of length l, -1 if none; [17] sentinel
+  int32_t valoffset[17];    // [l]: index of the first symbol of length l minus its code
+  const HuffTable* source;  // symbol values are read through it
+  uint32_t lookahead[256];  // next 8 bits -> (length << 8) | symbol, or kLongCode
+  FastTables* fast;         // wider tables of baseline tables (owned), or null
 };
 
 // Wider lookups of a baseline table, used where the window is known to hold
@@ -54,11 +54,11 @@ constexpr uint32_t kSkipEob = 128;
 
 // Entropy state of the current scan.
 struct EntropyState {
-  uint8_t insufficient;          // zero bits were supplied after a marker
-  uint32_t bit_buffer;           // valid bits are the low bits_left bits
+  uint8_t insufficient;  // zero bits were supplied after a marker
+  uint32_t bit_buffer;   // valid bits are the low bits_left bits
   int32_t bits_left;
-  int32_t last_dc[4];            // DC predictor per scan component
-  uint32_t restarts_to_go;       // MCUs left before the next restart marker
+  int32_t last_dc[4];       // DC predictor per scan component
+  uint32_t restarts_to_go;  // MCUs left before the next restart marker
   DerivedHuffTable* dc_tables[4];
   DerivedHuffTable* ac_tables[4];
   AcSkipTable* ac_skip[4];

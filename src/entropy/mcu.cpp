@@ -213,8 +213,8 @@ VJ_ALWAYS_INLINE bool skip_ac_left(LeftBits& lb, R& r, const uint16_t* wide, int
 // Skips the rest of a block from position k on left-aligned bits, taking
 // symbols by hand where the table cannot. False when the input ended.
 template <class R>
-VJ_ALWAYS_INLINE bool skip_rest_left(LeftBits& lb, R& r, const DerivedHuffTable* act, const uint16_t* wide,
-                           int32_t k) {
+VJ_ALWAYS_INLINE bool skip_rest_left(LeftBits& lb, R& r, const DerivedHuffTable* act,
+                                     const uint16_t* wide, int32_t k) {
   while (k < 64 && !skip_ac_left(lb, r, wide, &k)) {
     lb.store(r);
     bool ok = true;
@@ -276,11 +276,10 @@ inline bool skip_ac(R& r, const DerivedHuffTable* act, const AcSkipTable* skip, 
   while (k < 64) {
     r.prefetch8();
     if (r.bits >= 8) {
-      const SkipStep step =
-          take_lookup(r,
-                      wide != nullptr ? wide_entry(wide[r.peek(kWideSkipBits)])
-                                      : narrow_entry(skip->entry[r.peek(8)]),
-                      &k);
+      const SkipStep step = take_lookup(r,
+                                        wide != nullptr ? wide_entry(wide[r.peek(kWideSkipBits)])
+                                                        : narrow_entry(skip->entry[r.peek(8)]),
+                                        &k);
       if (step == SkipStep::kGoOn) continue;
       if (step == SkipStep::kEnds) return true;
     }
@@ -332,8 +331,8 @@ inline bool skip_rest(BitReader<F>& r, const DerivedHuffTable* act, const AcSkip
   return skip_ac(r, act, skip, k);
 }
 template <class R>
-VJ_ALWAYS_INLINE bool skip_rest(LeftReader<R>& src, const DerivedHuffTable* act,
-                                const AcSkipTable*, int32_t k) {
+VJ_ALWAYS_INLINE bool skip_rest(LeftReader<R>& src, const DerivedHuffTable* act, const AcSkipTable*,
+                                int32_t k) {
   return skip_rest_left(src.lb, src.r, act, act->fast->skip, k);
 }
 
@@ -430,8 +429,8 @@ bool run_blocks(Src& src, DecoderInfo* d, int16_t** blocks, int32_t* pred, bool*
     int32_t* p = &pred[d->mcu_membership[b] & 3];
     const AcSkipTable* skip = !kStore || kLastStored < 63 ? e->block_skip[b] : nullptr;
     int32_t last;
-    if (!decode_block<kStore ? kLastStored : 0, kStore>(src, dct, act, skip,
-                                                         kStore ? blocks[b] : nullptr, p, &last))
+    if (!decode_block < kStore ? kLastStored : 0,
+        kStore > (src, dct, act, skip, kStore ? blocks[b] : nullptr, p, &last))
       return false;
     if constexpr (kStore) d->last_nonzero[b] = last;
     if constexpr (kDcCheck) {
@@ -453,8 +452,8 @@ bool run_mcu(BitReader<Fetch>& r, DecoderInfo* d, int16_t** blocks, bool* dc_out
     for (uint32_t b = 0; b < d->blocks_in_mcu; ++b) {
       const DerivedHuffTable* dct = e->block_dc[b];
       const DerivedHuffTable* act = e->block_ac[b];
-      left = left && dct != nullptr && dct->fast != nullptr && act != nullptr &&
-             act->fast != nullptr;
+      left =
+          left && dct != nullptr && dct->fast != nullptr && act != nullptr && act->fast != nullptr;
     }
     if (left) {
       LeftReader<BitReader<Fetch>> src(r);

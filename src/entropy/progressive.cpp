@@ -166,10 +166,14 @@ bool ac_refine(Reader& r, DecoderInfo* d, int16_t** blocks) {
 template <Pass kPass, class Reader>
 bool run_pass(Reader& r, DecoderInfo* d, int16_t** blocks) {
   switch (kPass) {
-    case Pass::kDcFirst: return dc_first(r, d, blocks);
-    case Pass::kDcRefine: return dc_refine(r, d, blocks);
-    case Pass::kAcFirst: return ac_first(r, d, blocks);
-    default: return ac_refine(r, d, blocks);
+    case Pass::kDcFirst:
+      return dc_first(r, d, blocks);
+    case Pass::kDcRefine:
+      return dc_refine(r, d, blocks);
+    case Pass::kAcFirst:
+      return ac_first(r, d, blocks);
+    default:
+      return ac_refine(r, d, blocks);
   }
 }
 
