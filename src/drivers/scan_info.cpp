@@ -5,14 +5,40 @@
 
 namespace {
 
-uint32_t next_byte_position(const DecoderInfo* d) { return vj::window_tell(d->window); }
+// What a record keeps of the decoder, as (decoder field, record field)
+// pairs: one list serves saving and loading. The scan's parameters and MCU
+// layout are fixed for the scan; the moving parts change as it is decoded.
+template <class F>
+void scan_fields(DecoderInfo* d, ScanInfo* s, F&& f) {
+  f(d->comps_in_scan, s->comps_in_scan);
+  f(d->scan_comp_index, s->comp_index);
+  f(d->Ss, s->Ss);
+  f(d->Se, s->Se);
+  f(d->Ah, s->Ah);
+  f(d->Al, s->Al);
+  f(d->blocks_in_mcu, s->blocks_in_mcu);
+  f(d->mcu_rows, s->mcu_rows);
+  f(d->mcus_per_row, s->mcus_per_row);
+  f(d->restart_interval, s->restart_interval);
+}
+template <class F>
+void moving_fields(DecoderInfo* d, ScanInfo* s, F&& f) {
+  f(d->unread_marker, s->unread_marker);
+  f(d->marker->next_restart, s->next_restart);
+  f(d->eob_run, s->eob_run);
+  f(*d->entropy, s->entropy);
+}
 
-void save_moving_parts(const DecoderInfo* d, ScanInfo* s) {
-  s->unread_marker = d->unread_marker;
-  s->next_restart = d->marker->next_restart;
-  s->eob_run = d->eob_run;
-  s->entropy = *d->entropy;
-  s->position = next_byte_position(d);
+template <class To, class From>
+void assign(To& to, const From& from) {
+  to = static_cast<To>(from);
+}
+constexpr auto kToRecord = [](const auto& dv, auto& sv) { assign(sv, dv); };
+constexpr auto kToDecoder = [](auto& dv, const auto& sv) { assign(dv, sv); };
+
+void save_moving_parts(DecoderInfo* d, ScanInfo* s) {
+  moving_fields(d, s, kToRecord);
+  s->position = vj::window_tell(d->window);
 }
 
 }  // namespace
@@ -21,16 +47,7 @@ bool VETAJ_SetupScanInfo(DecoderInfo* d, ScanInfo** slot) {
   if (d->entropy == nullptr) return false;
   ScanInfo* s = vj::alloc_zeroed<ScanInfo>();
   if (s == nullptr) return false;
-  s->comps_in_scan = d->comps_in_scan;
-  s->comp_index = d->scan_comp_index;
-  s->Ss = d->Ss;
-  s->Se = d->Se;
-  s->Ah = d->Ah;
-  s->Al = d->Al;
-  s->blocks_in_mcu = d->blocks_in_mcu;
-  s->mcu_rows = d->mcu_rows;
-  s->mcus_per_row = d->mcus_per_row;
-  s->restart_interval = d->restart_interval;
+  scan_fields(d, s, kToRecord);
   save_moving_parts(d, s);
   s->unread_marker = 0;
   for (uint32_t i = 0; i < d->comps_in_scan && i < 4; ++i)
@@ -43,20 +60,9 @@ bool VETAJ_SetupScanInfo(DecoderInfo* d, ScanInfo** slot) {
 void VETAJ_SaveScanInfo(DecoderInfo* d, ScanInfo* s) { save_moving_parts(d, s); }
 
 bool VETAJ_LoadScanInfo(DecoderInfo* d, ScanInfo* s) {
-  d->comps_in_scan = static_cast<uint8_t>(s->comps_in_scan);
-  d->scan_comp_index = s->comp_index;
-  d->Ss = s->Ss;
-  d->Se = s->Se;
-  d->Ah = s->Ah;
-  d->Al = s->Al;
-  d->unread_marker = s->unread_marker;
-  d->marker->next_restart = static_cast<uint8_t>(s->next_restart & 7);
-  d->blocks_in_mcu = static_cast<uint8_t>(s->blocks_in_mcu);
-  d->mcu_rows = s->mcu_rows;
-  d->mcus_per_row = s->mcus_per_row;
-  d->restart_interval = s->restart_interval;
-  d->eob_run = s->eob_run;
-  *d->entropy = s->entropy;
+  scan_fields(d, s, kToDecoder);
+  moving_fields(d, s, kToDecoder);
+  d->marker->next_restart &= 7;
   if (!vj::window_seek(d->window, s->position)) return false;
   (void)VETAJ_CheckBuffer(d->window, 1);
   for (uint32_t b = 0; b < 10; ++b) d->mcu_membership[b] = s->membership[b];
