@@ -40,13 +40,8 @@ void vj_release_decoder(DecoderInfo*& d) {
 int32_t VETAJ_ProcessData(DecoderInfo* d, uint8_t* output, uint32_t* row_ctr,
                           uint32_t rows_avail) {
   RowController& ctl = d->controller;
-  int32_t status = 0;
-  if (ctl.buffer_full == 0) {
-    if (ctl.finished != 0) return vj::kStatusEnd;
-    status = vj_fill_imcu_buffer(d, ctl.which_set, true);
-    if (status == vj::kStatusFail) return status;
-    if (status == vj::kStatusEnd) status = 0;
-  }
+  int32_t status;
+  if (!vj_refill_rows(d, ctl.which_set, true, &status)) return status;
   switch (ctl.context_state) {
     case kPostponed:
       VETAJ_SetupUpsample(d, output, row_ctr, rows_avail);
@@ -76,21 +71,6 @@ int32_t VETAJ_ProcessData(DecoderInfo* d, uint8_t* output, uint32_t* row_ctr,
   return status;
 }
 
-int32_t VETAJ_Decode_Dualcore_1to1(DecInfo* o, OutputRequest* /*request*/, DecoderInfo* d,
-                                   uint32_t image_height) {
-  uint32_t counter = rows_consumed(d);
-  const uint32_t target = static_cast<uint32_t>(d->crop_y + d->cropped_reduced_height);
-  int32_t status = 0;
-  while (counter < target) {
-    if (o->cancel != 0) return vj::kStatusCancelled;
-    uint32_t rows = 0;
-    status = VETAJ_ProcessData(d, nullptr, &rows, 1);
-    counter += rows;
-    if (status == vj::kStatusFail || status == vj::kStatusEnd || counter >= image_height) break;
-  }
-  return status;
-}
-
 namespace {
 
 using RowStep = int32_t (*)(DecoderInfo*, uint8_t*, uint32_t*, uint32_t);
@@ -115,8 +95,8 @@ int32_t skip_crop_rows(DecInfo* o, DecoderInfo* d, RowStep step) {
   return status;
 }
 
-// Rows until the cropped picture is complete.
-int32_t run_rows(DecInfo* o, DecoderInfo* d, RowStep step) {
+// Rows until the cropped picture is complete, or `limit` rows are out.
+int32_t run_rows(DecInfo* o, DecoderInfo* d, RowStep step, uint32_t limit = UINT32_MAX) {
   const uint32_t end = static_cast<uint32_t>(d->crop_y + d->cropped_reduced_height);
   uint32_t counter = rows_consumed(d);
   int32_t status = 0;
@@ -125,12 +105,17 @@ int32_t run_rows(DecInfo* o, DecoderInfo* d, RowStep step) {
     uint32_t rows = 0;
     status = step(d, nullptr, &rows, 1);
     counter += rows;
-    if (status == vj::kStatusFail || status == vj::kStatusEnd) break;
+    if (status == vj::kStatusFail || status == vj::kStatusEnd || counter >= limit) break;
   }
   return status;
 }
 
 }  // namespace
+
+int32_t VETAJ_Decode_Dualcore_1to1(DecInfo* o, OutputRequest* /*request*/, DecoderInfo* d,
+                                   uint32_t image_height) {
+  return run_rows(o, d, VETAJ_ProcessData, image_height);
+}
 
 int32_t VETAJ_DecodeImage(DecInfo* o, StreamWindow* w, OutputRequest* req) {
   DecoderInfo* d = VETAJ_Initialize(o, w, req);
@@ -144,25 +129,18 @@ int32_t VETAJ_DecodeImage(DecInfo* o, StreamWindow* w, OutputRequest* req) {
     vj::set_error(KOLVAVETA_ERR_SETUP);
     return vj::kStatusFail;
   }
-  int32_t status;
-  if (vj_needs_scan_walk(d)) {
+  const bool walk = vj_needs_scan_walk(d);
+  if (walk) {
     // At 1/8 a progressive frame needs only the DC values of its first scan;
     // otherwise every scan is recorded and resumed row by row.
     const bool dc_only = d->scale_shift == 3 && vj_prepare_dc_only(d);
     if (!dc_only && vj_walk_scans(d) != vj::kStatusOk) return vj::kStatusFail;
-    const RowStep step = d->scale_shift == 0 ? VETAJ_ProcessData : VETAJ_ProcessData_resize;
-    status = skip_crop_rows(o, d, step);
-    if (status == vj::kStatusFail || status == vj::kStatusCancelled) return status;
-    status = run_rows(o, d, step);
-  } else if (d->scale_shift == 0) {
-    status = skip_crop_rows(o, d, VETAJ_ProcessData);
-    if (status == vj::kStatusFail || status == vj::kStatusCancelled) return status;
-    status = VETAJ_Decode_Dualcore_1to1(o, req, d, d->reduced_height);
-  } else {
-    status = skip_crop_rows(o, d, VETAJ_ProcessData_resize);
-    if (status == vj::kStatusFail || status == vj::kStatusCancelled) return status;
-    status = run_rows(o, d, VETAJ_ProcessData_resize);
   }
+  const RowStep step = d->scale_shift == 0 ? VETAJ_ProcessData : VETAJ_ProcessData_resize;
+  int32_t status = skip_crop_rows(o, d, step);
+  if (status == vj::kStatusFail || status == vj::kStatusCancelled) return status;
+  status = !walk && d->scale_shift == 0 ? VETAJ_Decode_Dualcore_1to1(o, req, d, d->reduced_height)
+                                        : run_rows(o, d, step);
   if (status == vj::kStatusCancelled) return status;
   return status == vj::kStatusFail ? vj::kStatusFail : vj::kStatusOk;
 }

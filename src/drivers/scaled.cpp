@@ -380,34 +380,50 @@ void release_buffer(DecoderInfo* d) {
 
 }  // namespace
 
+bool vj_refill_rows(DecoderInfo* d, uint32_t which, bool check, int32_t* status) {
+  RowController& ctl = d->controller;
+  *status = 0;
+  if (ctl.buffer_full != 0) return true;
+  if (ctl.finished != 0) {
+    *status = vj::kStatusEnd;
+    return false;
+  }
+  const int32_t filled = vj_fill_imcu_buffer(d, which, check);
+  if (filled == vj::kStatusFail) {
+    *status = filled;
+    return false;
+  }
+  *status = filled == vj::kStatusEnd ? 0 : filled;
+  return true;
+}
+
+namespace {
+
+using Upsample = void (*)(DecoderInfo*, uint8_t*, uint32_t*, uint32_t);
+
+// One step of the reduced row controller: a fresh iMCU row when the last
+// one is used up, then its rows through `upsample`.
+template <Upsample kUpsample, bool kCheck>
+int32_t reduced_step(DecoderInfo* d, uint8_t* output, uint32_t* row_ctr, uint32_t rows_avail) {
+  const bool fresh = d->controller.buffer_full == 0;
+  int32_t status;
+  if (!vj_refill_rows(d, 0, kCheck, &status)) return status;
+  if (fresh) d->controller.group_counter = 0;
+  kUpsample(d, output, row_ctr, rows_avail);
+  release_buffer(d);
+  return status;
+}
+
+}  // namespace
+
 int32_t VETAJ_ProcessData_resize(DecoderInfo* d, uint8_t* output, uint32_t* row_ctr,
                                  uint32_t rows_avail) {
-  RowController& ctl = d->controller;
-  int32_t status = 0;
-  if (ctl.buffer_full == 0) {
-    if (ctl.finished != 0) return vj::kStatusEnd;
-    status = vj_fill_imcu_buffer(d, 0, true);
-    if (status == vj::kStatusFail) return status;
-    ctl.group_counter = 0;
-  }
-  VETAJ_SetupUpsample(d, output, row_ctr, rows_avail);
-  release_buffer(d);
-  return status == vj::kStatusEnd ? 0 : status;
+  return reduced_step<VETAJ_SetupUpsample, true>(d, output, row_ctr, rows_avail);
 }
 
 int32_t VETAJ_ProcessDataSkipRow(DecoderInfo* d, uint8_t* output, uint32_t* row_ctr,
                                  uint32_t rows_avail) {
-  RowController& ctl = d->controller;
-  int32_t status = 0;
-  if (ctl.buffer_full == 0) {
-    if (ctl.finished != 0) return vj::kStatusEnd;
-    status = vj_fill_imcu_buffer(d, 0, false);
-    if (status == vj::kStatusFail) return status;
-    ctl.group_counter = 0;
-  }
-  VETAJ_SkipRowUpsample(d, output, row_ctr, rows_avail);
-  release_buffer(d);
-  return status == vj::kStatusEnd ? 0 : status;
+  return reduced_step<VETAJ_SkipRowUpsample, false>(d, output, row_ctr, rows_avail);
 }
 
 int32_t vj_fill_imcu_buffer(DecoderInfo* d, uint32_t which, bool check) {

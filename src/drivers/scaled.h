@@ -47,6 +47,11 @@ int32_t VETAJ_ProcessDataSkipRow(DecoderInfo* decoder, uint8_t* output, uint32_t
 // callback when `check`): the decode status, or 201 when the callback
 // aborts or the data is corrupt. Marks the controller's buffer full.
 int32_t vj_fill_imcu_buffer(DecoderInfo* decoder, uint32_t which, bool check);
+// Fills the buffer as above when its rows are used up. False when there is
+// nothing to deliver, with *status 101 (the picture was finished) or 201;
+// otherwise *status is the fill's status, 0 for a fill that reached the end
+// (its rows are still to be delivered) or when no fill was needed.
+bool vj_refill_rows(DecoderInfo* decoder, uint32_t which, bool check, int32_t* status);
 
 // Helpers.
 uint32_t GCD(uint32_t a, uint32_t b);
