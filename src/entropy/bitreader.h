@@ -45,6 +45,14 @@ extern bool g_entropy_careful_only;
 // read behind them. Returns the bytes now available.
 uint32_t entropy_top_up(DecoderInfo* d, uint32_t want);
 
+// Whether the fast policy may decode the next `blocks` blocks: no marker is
+// pending and the window holds (after a top-up) every byte they can need.
+inline bool fast_policy_fits(DecoderInfo* d, uint32_t blocks) {
+  const uint32_t margin = fast_margin(blocks);
+  return d->unread_marker == 0 && !g_entropy_careful_only &&
+         (d->window->remaining >= margin || entropy_top_up(d, margin) >= margin);
+}
+
 // Four bytes in memory order as a big-endian value.
 inline uint32_t load_be32(uint32_t native) {
   if constexpr (std::endian::native == std::endian::little) return __builtin_bswap32(native);

@@ -497,9 +497,7 @@ int32_t decode_mcu(DecoderInfo* d, int16_t** blocks) {
   }
   const uint32_t nb = d->blocks_in_mcu;
   bool dc_bad = false;
-  const uint32_t margin = vj::fast_margin(nb);
-  if (d->unread_marker == 0 && !vj::g_entropy_careful_only &&
-      (d->window->remaining >= margin || vj::entropy_top_up(d, margin) >= margin)) {
+  if (vj::fast_policy_fits(d, nb)) {
     const int32_t saved_dc[4] = {e->last_dc[0], e->last_dc[1], e->last_dc[2], e->last_dc[3]};
     BitReader<FastFetch> fast(d);
     if (run_mcu<kLastStored, kKeep, kDcCheck>(fast, d, blocks, &dc_bad) && !fast.marker_seen) {

@@ -187,9 +187,7 @@ int32_t decode_prog_mcu(DecoderInfo* d, int16_t** blocks) {
   // need, the fast policy decodes it; a marker met on the way sends the
   // block back, as it was, to the careful policy.
   if constexpr (kPass == Pass::kAcFirst || kPass == Pass::kAcRefine) {
-    const uint32_t margin = vj::fast_margin(1);
-    if (d->blocks_in_mcu == 1 && d->unread_marker == 0 && !vj::g_entropy_careful_only &&
-        (d->window->remaining >= margin || vj::entropy_top_up(d, margin) >= margin)) {
+    if (d->blocks_in_mcu == 1 && vj::fast_policy_fits(d, 1)) {
       int16_t saved[64];
       std::memcpy(saved, blocks[0], sizeof saved);
       const uint32_t eob_run = d->eob_run;
