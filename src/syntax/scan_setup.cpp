@@ -30,13 +30,13 @@ bool bind_quant_table(DecoderInfo* d, ComponentInfo* c) {
 }
 
 // Lays out the per-block tables of one component starting at block b.
-void lay_out_blocks(DecoderInfo* d, EntropyState* e, const ComponentInfo* c, uint32_t owner,
-                    uint32_t count) {
+void lay_out_blocks(DecoderInfo* d, EntropyState* e, AcSkipTable* const* skips,
+                    const ComponentInfo* c, uint32_t owner, uint32_t count) {
   for (uint32_t i = 0; i < count; ++i) {
     const uint32_t b = d->blocks_in_mcu++;
     e->block_dc[b] = e->dc_tables[c->dc_no & 3];
     e->block_ac[b] = e->ac_tables[c->ac_no & 3];
-    e->block_skip[b] = e->ac_skip[c->ac_no & 3];
+    e->block_skip[b] = skips[c->ac_no & 3];
     d->mcu_membership[b] = owner;
   }
 }
@@ -115,11 +115,7 @@ int32_t VETAJ_SetupScan(DecoderInfo* d) {
     }
     if (!borrowing && !build_tables(d, e, c, progressive)) return vj::kStatusFail;
     if (c->dc_no > 3 || c->ac_no > 3) return vj::kStatusFail;
-    e->block_dc[0] = e->dc_tables[c->dc_no];
-    e->block_ac[0] = e->ac_tables[c->ac_no];
-    e->block_skip[0] = skips[c->ac_no];
-    d->mcu_membership[0] = progressive ? c->index : 0;
-    d->blocks_in_mcu = 1;
+    lay_out_blocks(d, e, skips, c, progressive ? c->index : 0, 1);
     if (!borrowing) e->restarts_to_go = d->restart_interval;
     return vj::kStatusOk;
   }
@@ -146,9 +142,7 @@ int32_t VETAJ_SetupScan(DecoderInfo* d) {
     if (!borrowing && !build_tables(d, e, c, progressive)) return vj::kStatusFail;
     if (c->dc_no > 3 || c->ac_no > 3) return vj::kStatusFail;
     if (d->blocks_in_mcu + c->mcu_blocks > kMaxBlocksInMcu) return vj::kStatusFail;
-    const uint32_t first = d->blocks_in_mcu;
-    lay_out_blocks(d, e, c, p, c->mcu_blocks);
-    for (uint32_t b = first; b < d->blocks_in_mcu; ++b) e->block_skip[b] = skips[c->ac_no];
+    lay_out_blocks(d, e, skips, c, p, c->mcu_blocks);
   }
   if (!borrowing) e->restarts_to_go = d->restart_interval;
   return vj::kStatusOk;
