@@ -27,10 +27,6 @@ namespace {
 using namespace vjtest;
 using enum Sampling;
 
-bool all_fill(const std::vector<uint8_t>& bytes) {
-  return std::all_of(bytes.begin(), bytes.end(), [](uint8_t b) { return b == kFill; });
-}
-
 // `picture` resized to out_w x out_h by a sampling rule, centred in a buffer.
 ::testing::AssertionResult shows_picture(const Decoded& d, const FullPicture& picture,
                                          Sampling sampling, int format, int buffer_w, int buffer_h,
@@ -120,29 +116,19 @@ void PrintTo(const PictureCase& c, std::ostream* os) {
 }
 
 // YCbCr outputs of at most 99x99 pixels, and mode 1 within 12/7 of the
-// picture, take centre sampling; other YCbCr outputs, enlargements in modes
-// 0 and 1, and every grey, RGB, CMYK and YCCK picture take the averages.
-// The embedded thumbnails show their own picture (red and blue swapped, a
-// yellow frame), so a decode of the main picture cannot pass for them.
+// picture, take centre sampling; other YCbCr outputs and every grey, RGB,
+// CMYK and YCCK picture take the averages. The embedded thumbnails show
+// their own picture, so a decode of the main picture cannot pass for them.
 const PictureCase kPictureCases[] = {
-    {"sample.jpg", 0x000, 0, 500, 375, 500, 375, 0, kAverage},
-    {"base_420_q90_96x64.jpg", 0x000, 0, 80, 60, 80, 53, 0, kCentre},
-    {"base_420_q90_96x64.jpg", 0x700, 0, 150, 100, 150, 100, 0, kAverage},
-    {"base_420_q90_96x64.jpg", 0x700, 2, 90, 70, 90, 70, 0, kAverage},
     {"base_420_q75_1024x1024.jpg", 0x000, 1, 700, 700, 700, 700, 1, kCentre},
     {"base_420_q75_1024x1024.jpg", 0x000, 0, 700, 700, 700, 700, 0, kAverage},
     {"base_420_q75_1024x1024.jpg", 0x000, 1, 598, 598, 598, 598, 1, kCentre},
     {"base_420_q75_1024x1024.jpg", 0x000, 1, 597, 597, 597, 597, 1, kAverage},
     {"base_420_q90_1024x768.jpg", 0x000, 1, 700, 525, 700, 525, 0, kAverage},
     {"base_422_q70_100x75.jpg", 0x700, 0, 77, 60, 77, 60, 0, kCentre},
-    {"base_422_q70_100x75.jpg", 0x700, 0, 130, 90, 130, 90, 0, kAverage},
-    {"base_444_q95_63x65.jpg", 0x000, 0, 50, 50, 48, 50, 0, kCentre},
     {"base_mixed_y22_cb12_cr21_q85_64x48.jpg", 0x700, 0, 50, 40, 50, 40, 0, kCentre},
     {"grey_q100_40x30.jpg", 0x700, 0, 33, 25, 33, 25, 0, kAverage},
-    {"grey_q100_40x30.jpg", 0x700, 0, 70, 50, 70, 50, 0, kAverage},
     {"rgb_adobe_q90_64x48.jpg", 0x700, 0, 50, 37, 50, 37, 0, kAverage},
-    {"rgb_adobe_q90_64x48.jpg", 0x700, 0, 90, 60, 90, 60, 0, kAverage},
-    {"cmyk_adobe_444_q90_64x48.jpg", 0x700, 0, 100, 70, 100, 70, 0, kAverage},
     {"cmyk_adobe_2x2_q85_64x48.jpg", 0x700, 0, 40, 30, 40, 30, 0, kAverage},
     {"ycck_adobe_y22_k22_q85_63x65.jpg", 0x700, 0, 40, 50, 40, 50, 0, kAverage},
     // Pictures narrower or lower than 1024 pixels, and every picture whose
@@ -150,37 +136,24 @@ const PictureCase kPictureCases[] = {
     // mode asked.
     {"base_420_q90_96x64.jpg", 0x000, 3, 96, 64, 96, 64, 0, kCentre},
     {"base_420_q81_1023x17.jpg", 0x000, 4, 1023, 17, 1023, 17, 0, kCentre},
-    {"base_420_q88_17x1023.jpg", 0x000, 2, 17, 1023, 17, 1023, 0, kCentre},
     {"base_420_q75_1024x1024.jpg", 0x001, 1, 700, 700, 700, 700, 0, kAverage},
     // A sample size makes the target the picture divided by it, limited to
     // the buffer.
     {"base_420_q90_96x64.jpg", 0x001, 0, 200, 100, 96, 64, 0, kCentre, 0, 0, 1},
-    {"base_420_q90_96x64.jpg", 0x001, 0, 80, 80, 80, 53, 0, kCentre, 0, 0, 1},
     // Exif thumbnail of 160x120: used when it covers the request.
-    {"exif_thumb_ii_640x480.jpg", 0x000, 0, 160, 120, 160, 120, 0, kCentre, 160, 120},
-    {"exif_thumb_ii_640x480.jpg", 0x003, 0, 160, 120, 160, 120, 0, kCentre, 160, 120},
     {"exif_thumb_ii_640x480.jpg", 0x000, 0, 150, 100, 133, 100, 0, kCentre, 160, 120},
     {"exif_thumb_ii_640x480.jpg", 0x000, 0, 480, 360, 480, 360, 0, kAverage},
-    {"exif_thumb_ii_640x480.jpg", 0x001, 0, 400, 300, 400, 300, 0, kAverage},
-    // Policy 2 takes the thumbnail whatever its size: smaller than the
-    // request, it is decoded at its own size.
-    {"exif_thumb_ii_640x480.jpg", 0x002, 0, 400, 300, 160, 120, 0, kCentre, 160, 120},
-    // Stretched, the thumbnail is enlarged by centre sampling (thumbnails
-    // decode in the fast mode).
-    {"exif_thumb_ii_640x480.jpg", 0x702, 0, 330, 250, 330, 250, 0, kCentre, 160, 120},
     {"exif_thumb_mm_320x240.jpg", 0x000, 0, 80, 60, 80, 60, 0, kCentre, 80, 60},
-    {"exif_thumb_mm_320x240.jpg", 0x000, 0, 200, 150, 200, 150, 0, kAverage},
-    {"exif_thumb_mm_320x240.jpg", 0x002, 0, 200, 150, 80, 60, 0, kCentre, 80, 60},
     {"thumb_jfxx_jpeg_128x96.jpg", 0x000, 0, 32, 24, 32, 24, 0, kCentre, 32, 24},
-    {"thumb_jfxx_jpeg_128x96.jpg", 0x000, 0, 100, 75, 100, 75, 0, kAverage},
+    // Policy 2 takes the thumbnail whatever its size: smaller than the
+    // request, it is decoded at its own size; stretched, it is enlarged by
+    // centre sampling (thumbnails decode in the fast mode).
+    {"exif_thumb_ii_640x480.jpg", 0x002, 0, 400, 300, 160, 120, 0, kCentre, 160, 120},
+    {"exif_thumb_ii_640x480.jpg", 0x702, 0, 330, 250, 330, 250, 0, kCentre, 160, 120},
     // An image-resource thumbnail must be strictly larger than the request.
-    {"thumb_app13_jpeg_640x480.jpg", 0x000, 0, 150, 100, 133, 100, 0, kCentre, 160, 120},
     {"thumb_app13_jpeg_640x480.jpg", 0x000, 0, 159, 119, 159, 119, 0, kCentre, 160, 120},
-    {"thumb_app13_jpeg_640x480.jpg", 0x002, 0, 400, 300, 160, 120, 0, kCentre, 160, 120},
     // Uncompressed thumbnails are never decoded: the main picture is.
     {"thumb_jfxx_rgb_128x96.jpg", 0x002, 0, 128, 96, 128, 96, 0, kCentre},
-    {"thumb_jfxx_pal_128x96.jpg", 0x003, 0, 128, 96, 128, 96, 0, kCentre},
-    {"thumb_jfif_rgb4x3_64x48.jpg", 0x002, 0, 64, 48, 64, 48, 0, kCentre},
     {"thumb_jfif_rgb4x3_64x48.jpg", 0x003, 0, 64, 48, 64, 48, 0, kCentre},
 };
 
@@ -304,11 +277,9 @@ TEST(Thumbnails, SampleSizeSelectsTheThumbnail) {
 // decode without the option, leave it upright. The object reports the
 // rotation among its options and keeps the options it was given.
 TEST(Orientation, RotatesByTheTagAndKeepsTheBits) {
-  for (const char* fixture :
-       {"exif_orient1_ii_48x32.jpg", "exif_orient2_ii_48x32.jpg", "exif_orient3_ii_48x32.jpg",
-        "exif_orient4_ii_48x32.jpg", "exif_orient5_ii_48x32.jpg", "exif_orient6_ii_48x32.jpg",
-        "exif_orient7_ii_48x32.jpg", "exif_orient8_ii_48x32.jpg", "exif_orient3_mm_48x32.jpg",
-        "exif_orient6_mm_48x32.jpg", "exif_orient8_mm_48x32.jpg"}) {
+  for (const char* fixture : {"exif_orient2_ii_48x32.jpg", "exif_orient3_ii_48x32.jpg",
+                              "exif_orient5_ii_48x32.jpg", "exif_orient6_mm_48x32.jpg",
+                              "exif_orient8_ii_48x32.jpg"}) {
     const int tag = fixture[11] - '0';  // exif_orientN_...
     const uint32_t rotation = tag == 6 ? 4u : tag == 8 ? 12u : tag == 3 ? 8u : 0u;
     const Bytes jpeg = read_fixture(fixture);
@@ -462,9 +433,8 @@ TEST(Cancel, AbortsLeaveTheObjectReusable) {
 TEST(DamagedData, TruncatedData) {
   for (const auto& [fixture, mcu_rows] :
        {std::pair{"base_444_rst_row_q85_48x40.jpg", 8},
-        std::pair{"base_420_opt_rst4_q92_63x65.jpg", 16}, std::pair{"base_444_q90_64x48.jpg", 0},
-        std::pair{"grey_q90_64x48.jpg", 0}, std::pair{"base_422_q85_64x48.jpg", 0},
-        std::pair{"base_420_q92_17x33.jpg", 0}, std::pair{"cmyk_adobe_444_q80_33x17.jpg", 0}}) {
+        std::pair{"base_420_opt_rst4_q92_63x65.jpg", 16}, std::pair{"base_422_q85_64x48.jpg", 0},
+        std::pair{"cmyk_adobe_444_q80_33x17.jpg", 0}}) {
     const Bytes jpeg = read_fixture(fixture);
     int w = 0, h = 0;
     ASSERT_TRUE(frame_size(jpeg, &w, &h));
@@ -548,8 +518,7 @@ TEST(DamagedData, FrameSizesThatDoNotMatchTheData) {
   const size_t sof = segment(jpeg, 0xC0);
   for (const auto& [w, h, refused] :
        {std::tuple{0, 64, true}, std::tuple{96, 0, true}, std::tuple{50001, 8, true},
-        std::tuple{8, 50001, true}, std::tuple{65535, 65535, true}, std::tuple{96, 6400, false},
-        std::tuple{4000, 64, false}, std::tuple{50000, 8, false}, std::tuple{1, 1, false},
+        std::tuple{8, 50001, true}, std::tuple{96, 6400, false}, std::tuple{50000, 8, false},
         std::tuple{17, 3, false}, std::tuple{97, 65, false}}) {
     Bytes patched = jpeg;
     patched[sof + 5] = uint8_t(h >> 8);
@@ -584,12 +553,8 @@ TEST(InputKinds, EveryKindAndEveryReuseGivesTheSamePixels) {
         {.format = 5, .width = 75, .height = 100, .options = 0x00D},
         {.width = 100, .height = 75}}},
       {"garbage_lead_420_64x48.jpg", {{.width = 64, .height = 48}}},
-      {"grey_rst2_q85_63x65.jpg", {{.format = 2, .width = 63, .height = 65}}},
-      {"cmyk_adobe_2x2_q85_64x48.jpg", {{.width = 64, .height = 48}}},
-      {"sample.jpg", {{.format = 8, .width = 800, .height = 600}}},
       {"exif_thumb_portrait_ii_240x320.jpg",
        {{.format = 0, .width = 45, .height = 60, .options = 3}, {.width = 60, .height = 80}}},
-      {"thumb_app13_jpeg_640x480.jpg", {{.width = 150, .height = 100, .options = 0}}},
   };
   for (const auto& [fixture, requests] : cases) {
     const Bytes jpeg = read_fixture(fixture);
@@ -621,32 +586,25 @@ TEST(InputKinds, EveryKindAndEveryReuseGivesTheSamePixels) {
 // The Adobe transform decides before the component ids (for four
 // components any value but 0 is YCCK), and a JFIF marker before both.
 TEST(ColourSpaces, DetectedFromComponentsAndMarkers) {
-  enum Space { kRgb, kYcc, kCmyk, kYcck };
   struct Case {
     const char* fixture;
     std::vector<uint8_t> ids;  // replacing the component ids, when given
     int transform;             // replacing the Adobe transform, when not -1
-    Space space;
-  } const cases[] = {{"rgb_adobe_q90_64x48.jpg", {1, 2, 3}, -1, kRgb},
-                     {"rgb_adobe_q90_64x48.jpg", {}, 1, kYcc},
-                     {"base_444_q90_64x48.jpg", {'R', 'G', 'B'}, -1, kYcc},
-                     {"cmyk_adobe_444_q90_64x48.jpg", {}, 2, kYcck},
-                     {"ycck_adobe_444_q90_64x48.jpg", {}, 1, kYcck},
-                     {"ycck_adobe_444_q90_64x48.jpg", {}, 0, kCmyk}};
+    int space;                 // 2 RGB, 3 YCbCr, 4 CMYK, 5 YCCK
+  } const cases[] = {{"rgb_adobe_q90_64x48.jpg", {1, 2, 3}, -1, 2},
+                     {"rgb_adobe_q90_64x48.jpg", {}, 1, 3},
+                     {"base_444_q90_64x48.jpg", {'R', 'G', 'B'}, -1, 3},
+                     {"cmyk_adobe_444_q90_64x48.jpg", {}, 2, 5},
+                     {"ycck_adobe_444_q90_64x48.jpg", {}, 1, 5},
+                     {"ycck_adobe_444_q90_64x48.jpg", {}, 0, 4}};
   for (const Case& c : cases) {
     const Bytes jpeg =
         with_adobe_transform(with_component_ids(read_fixture(c.fixture), c.ids), c.transform);
-    OraclePlanes raw;
-    ASSERT_TRUE(oracle_planes(jpeg, 1, &raw));
-    const int w = raw.width, h = raw.height;
-    const Decoded d = decode_bytes(jpeg, {.width = w, .height = h});
-    EXPECT_TRUE(shows(d, Placement::centred(7, w, h, w, h),
-                      [&](int x, int y) {
-                        const auto s = [&](int k) { return int(raw.at(x, y, k)); };
-                        if (c.space <= kYcc) return Colour{c.space == kYcc, s(0), s(1), s(2)};
-                        return (c.space == kCmyk ? cmyk_colour : ycck_colour)(s(0), s(1), s(2),
-                                                                              s(3));
-                      }))
+    FullPicture raw;
+    ASSERT_TRUE(oracle_picture(jpeg, c.space, &raw));
+    const Decoded d = decode_bytes(jpeg, {.width = raw.width, .height = raw.height});
+    EXPECT_TRUE(shows(d, Placement::centred(7, raw.width, raw.height, raw.width, raw.height),
+                      raw.at))
         << c.fixture << " case " << (&c - cases);
   }
 }
