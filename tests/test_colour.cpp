@@ -280,38 +280,6 @@ TEST(ConverterChoice, FollowsSizeModeAndRegion) {
 }
 
 // ---------------------------------------------------------------------------
-// Cursor edge cases.
-
-// Calls wider than the visible width (the row length of a buffer larger
-// than the picture) are clipped to it.
-TEST(Cursor, WideCallsAreClippedToTheVisibleWidth) {
-  Fixture f(kColourYcc);
-  ASSERT_EQ(f.select(5, 2, 5, 2), 200);
-  Canvas canvas = f.attach(7);
-  Planes s(3, 16, 2, 21);
-  const uint8_t* row0[3] = {s.row(0, 0), s.row(1, 0), s.row(2, 0)};
-  VETAJ_YcbcrWriteOutput1to1(f.d.get(), row0, 12);
-  VETAJ_YcbcrWriteOutput1to1_YUV444_toRGBA8888(f.d.get(), s.row(0, 1), nullptr, s.row(1, 1),
-                                               s.row(2, 1), 12);
-  EXPECT_TRUE(canvas.holds(source_colours(kColourYcc, s)));
-}
-
-TEST(Cursor, CropOffsetShiftsTheFirstSourceColumn) {
-  Fixture f(kColourRgb);
-  f.d->crop_x = 3;
-  f.d->reduced_width = 12;
-  ASSERT_EQ(vj_select_converter(f.d.get()), 201);  // no window yet
-  f.d->cropped_reduced_width = f.d->visible_width = 7;
-  f.d->reduced_height = 2;
-  f.d->cropped_reduced_height = f.d->visible_height = 2;
-  ASSERT_EQ(vj_select_converter(f.d.get()), 200);
-  Canvas canvas = f.attach(1);
-  Planes s(3, 12, 2, 9);
-  f.feed(s);
-  EXPECT_TRUE(canvas.holds(source_colours(kColourRgb, s, 3, 0)));
-}
-
-// ---------------------------------------------------------------------------
 // Region decoding: the first column is region_left AND the mask of the path
 // code; the rows outside the window are consumed without output.
 
@@ -324,9 +292,9 @@ class RegionColumns : public ::testing::TestWithParam<std::tuple<uint32_t, uint3
 };
 
 // A 4:2:0 fused writer on a region whose top row is odd and whose last row
-// ends inside a two-row call; an odd first column starts with a single
-// pixel.
-TEST_P(RegionColumns, FusedWriterHonoursWindowEdgesAndFirstColumn) {
+// ends inside a two-row call (an odd first column starts with a single
+// pixel), and the partial converters, which pass only the rows of the window.
+TEST_P(RegionColumns, WritersHonourWindowEdgesAndFirstColumn) {
   const auto [path, left] = GetParam();
   const int top = 3, rw = 5, rh = 4;
   for (const int format : {7, 0, 2}) {
@@ -344,15 +312,8 @@ TEST_P(RegionColumns, FusedWriterHonoursWindowEdgesAndFirstColumn) {
       const int sx = first_column() + x, sy = top + y;
       return Colour{true, luma.at(0, sx, sy), chroma.at(0, sx / 2, sy / 2),
                     chroma.at(1, sx / 2, sy / 2)};
-    })) << "format "
-        << format;
+    })) << "format " << format;
   }
-}
-
-// The partial converters pass only the rows of the window and start at the
-// region's first column.
-TEST_P(RegionColumns, PartialConvertersWriteOnlyTheWindow) {
-  const auto [path, left] = GetParam();
   for (const int space : {kColourYcc, kColourCmyk, kColourGrey}) {
     Fixture f(space);
     f.region(left, 2, 6, 3, path);
