@@ -432,12 +432,13 @@ TEST(DamagedData, TruncatedData) {
 
 // Every fixture cut at several points and with seeded bit flips (anywhere,
 // or only in the marker segments before the entropy data), through every
-// format, rotation, fit mode and thumbnail policy in turn, at its own size
-// and resized: the decode ends without touching memory outside the buffer
-// (run under the sanitizers).
+// format, rotation, fit mode, decode mode and thumbnail policy in turn, at
+// its own size and at every reduction: the decode ends without touching
+// memory outside the buffer (run under the sanitizers).
 TEST(DamagedData, CutsAndBitFlipsOverTheCorpus) {
   const int formats[] = {0, 1, 2, 5, 7, 8, 9, 4, 12};
   const uint32_t fits[] = {0x000, 0x300, 0x700, 0x100};
+  const std::pair<int, int> scales[] = {{1, 1}, {3, 4}, {1, 2}, {3, 8}, {1, 4}, {1, 8}, {1, 16}};
   std::mt19937 rng(20240611);
   size_t turn = 0;
   std::vector<std::string> files = list_fixtures(".jpg");
@@ -459,13 +460,14 @@ TEST(DamagedData, CutsAndBitFlipsOverTheCorpus) {
         for (int flips = 1 + int(rng() % 8); flips > 0; --flips)
           damaged[rng() % span] ^= uint8_t(1u << (rng() % 8));
       }
-      const bool resized = turn % 2 == 1;
+      const auto [num, den] = scales[turn % std::size(scales)];
       const Decoded d = decode_bytes(
           damaged, {.format = formats[turn % std::size(formats)],
-                    .width = resized ? w * 3 / 4 + 1 : w + int(turn % 3),
-                    .height = resized ? h * 5 / 6 + 1 : h + int(turn % 2),
+                    .width = std::max(1, w * num / den) + (num == den ? int(turn % 3) : 0),
+                    .height = std::max(1, h * num / den) + (num == den ? int(turn % 2) : 0),
                     .options = uint32_t(turn % 16) | fits[turn / 16 % std::size(fits)] |
-                               (turn % 5 == 0 ? KOLVAVETA_OPT_EXIF_ORIENT : 0u)});
+                               (turn % 5 == 0 ? KOLVAVETA_OPT_EXIF_ORIENT : 0u),
+                    .mode = int(turn % 5)});
       ASSERT_TRUE(d.guard_intact) << "variant " << v;
     }
   }
