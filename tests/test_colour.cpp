@@ -143,13 +143,10 @@ struct Fixture {
       y += n;
     }
   }
-  // The picture the chosen converter should make of the planes: centre
-  // sampling or quarter-point averages (YCbCr averaged before the
-  // conversion, the other spaces after it).
-  ColourAt resized(int space, const Planes& s) const {
-    const bool centre = converter.convert == VETAJ_DoFastYcbcrToRgb ||
-                        converter.convert == VETAJ_DoFastYcbcrToRgb_Partial ||
-                        converter.convert == VETAJ_DoFastYcbcrToUpscaleRgb;
+  // The picture a converter makes of the planes by centre sampling or
+  // quarter-point averages (YCbCr averaged before the conversion, the other
+  // spaces after it).
+  ColourAt resized(int space, const Planes& s, bool centre) const {
     return resampled(source_colours(space, s), centre ? Sampling::kCentre : Sampling::kAverage, 0,
                      0, s.w, s.h, d->visible_width, d->visible_height);
   }
@@ -202,24 +199,28 @@ TEST(ColourEquations, KnownValues) {
 // ---------------------------------------------------------------------------
 // Every format and rotation (the fused writers are checked by the whole-
 // picture tests), each colour space at 1:1 and resized over size pairs in
-// both directions and the decode modes that change the converter.
+// both directions. YCbCr takes centre sampling for outputs of at most 99x99
+// pixels, in mode 2 and in mode 1 within 12/7 of the picture, but enlarges
+// by centre sampling only in mode 2; everything else takes the averages.
 
 class Layout : public ::testing::TestWithParam<std::tuple<int, uint32_t>> {};
 
 TEST_P(Layout, ConvertersWriteEveryFormatAndRotation) {
   const auto [format, rotation] = GetParam();
-  const int cases[][6] = {
-      // space, mode, source size, output size
-      {kColourGrey, 0, 7, 5, 7, 5},       {kColourRgb, 0, 7, 5, 7, 5},
-      {kColourCmyk, 0, 7, 5, 7, 5},       {kColourYcck, 0, 7, 5, 7, 5},
-      {kColourYcc, 0, 7, 5, 7, 5},        {kColourYcc, 0, 11, 9, 5, 4},
-      {kColourYcc, 1, 13, 11, 5, 6},      {kColourYcc, 2, 5, 4, 13, 9},
-      {kColourYcc, 0, 1, 1, 4, 3},        {kColourYcc, 0, 120, 110, 240, 200},
-      {kColourCmyk, 0, 11, 9, 5, 4},      {kColourGrey, 0, 4, 3, 9, 7},
-      {kColourRgb, 0, 130, 8, 101, 5},    {kColourRgb, 0, 4, 3, 1, 1},
-      {kColourGrey, 0, 61, 200, 29, 110}, {kColourYcck, 4, 250, 130, 120, 101},
-      {kColourYcc, 1, 300, 7, 110, 3}};
-  for (const auto& [space, mode, sw, sh, dw, dh] : cases) {
+  const int cases[][7] = {
+      // space, mode, source size, output size, centre sampling
+      {kColourGrey, 0, 7, 5, 7, 5, 0},        {kColourRgb, 0, 7, 5, 7, 5, 0},
+      {kColourCmyk, 0, 7, 5, 7, 5, 0},        {kColourYcck, 0, 7, 5, 7, 5, 0},
+      {kColourYcc, 0, 7, 5, 7, 5, 1},         {kColourYcc, 0, 11, 9, 5, 4, 1},
+      {kColourYcc, 1, 13, 11, 5, 6, 1},       {kColourYcc, 2, 5, 4, 13, 9, 1},
+      {kColourYcc, 0, 1, 1, 4, 3, 0},         {kColourYcc, 1, 120, 110, 240, 200, 0},
+      {kColourYcc, 0, 160, 120, 100, 99, 0},  {kColourYcc, 2, 160, 120, 100, 99, 1},
+      {kColourYcc, 0, 160, 120, 99, 99, 1},   {kColourYcc, 1, 240, 240, 140, 140, 1},
+      {kColourYcc, 1, 241, 240, 140, 140, 0}, {kColourYcc, 1, 300, 7, 110, 3, 0},
+      {kColourCmyk, 0, 11, 9, 5, 4, 0},       {kColourGrey, 0, 4, 3, 9, 7, 0},
+      {kColourRgb, 0, 130, 8, 101, 5, 0},     {kColourRgb, 0, 4, 3, 1, 1, 0},
+      {kColourGrey, 0, 61, 200, 29, 110, 0},  {kColourYcck, 4, 250, 130, 120, 101, 0}};
+  for (const auto& [space, mode, sw, sh, dw, dh, centre] : cases) {
     SCOPED_TRACE(testing::Message() << "space " << space << " mode " << mode << " " << sw << "x"
                                     << sh << " -> " << dw << "x" << dh);
     Fixture f(space);
@@ -229,7 +230,7 @@ TEST_P(Layout, ConvertersWriteEveryFormatAndRotation) {
     Planes s(components_of(space), sw, sh + (sw == dw ? 3 : 0), uint32_t(space * 31 + sw));
     f.feed(s);
     s.h = sh;
-    EXPECT_TRUE(canvas.holds(f.resized(space, s)));
+    EXPECT_TRUE(canvas.holds(f.resized(space, s, centre == 1)));
     EXPECT_EQ(f.d->output_rows, uint32_t(dh));
   }
 }
@@ -238,36 +239,9 @@ INSTANTIATE_TEST_SUITE_P(AllFormats, Layout,
                          ::testing::Combine(::testing::Range(0, 13),
                                             ::testing::Values(0u, 4u, 8u, 12u)));
 
-// YCbCr takes centre sampling for outputs of at most 99x99 pixels, in mode
-// 2 and in mode 1 within 12/7 of the picture, else the averages; regions
-// take the partial converters.
-TEST(ConverterChoice, FollowsSizeModeAndRegion) {
-  struct Case {
-    int space, sw, sh, dw, dh, mode;
-    bool region;
-    ConvertFn expected;
-  };
-  const Case cases[] = {
-      {kColourYcc, 400, 300, 200, 150, 0, false, VETAJ_DoYcbcrToRgb},
-      {kColourYcc, 400, 300, 200, 150, 0, true, VETAJ_DoYcbcrToRgb_Partial},
-      {kColourYcc, 400, 300, 99, 99, 0, true, VETAJ_DoFastYcbcrToRgb_Partial},
-      {kColourYcc, 400, 300, 200, 150, 2, false, VETAJ_DoFastYcbcrToRgb},
-      {kColourYcc, 240, 240, 140, 140, 1, false, VETAJ_DoFastYcbcrToRgb},  // 7*240 <= 12*140
-      {kColourYcc, 241, 240, 140, 140, 1, false, VETAJ_DoYcbcrToRgb},
-      {kColourYcc, 50, 50, 60, 60, 1, false, VETAJ_DoYcbcrToUpscaleRgb},
-      {kColourYcc, 50, 50, 300, 300, 2, true, VETAJ_DoFastYcbcrToUpscaleRgb},
-      {kColourYcc, 200, 50, 100, 60, 0, false, VETAJ_DoYcbcrToUpscaleRgb},
-      {kColourCmyk, 20, 20, 10, 10, 0, true, VETAJ_DoCMYKToRgb_Partial},
-  };
-  for (const Case& c : cases) {
-    Fixture f(c.space);
-    if (c.region) f.owner.region_mode = 1;
-    ASSERT_EQ(f.select(c.sw, c.sh, c.dw, c.dh, c.mode), 200);
-    EXPECT_EQ(f.converter.convert, c.expected) << c.space << " " << c.sw << "x" << c.sh << " -> "
-                                               << c.dw << "x" << c.dh << " mode " << c.mode;
-  }
-  // Refused: an unknown colour space, empty sizes, a window past the
-  // reduced picture.
+// Refused: an unknown colour space, empty sizes, a window past the reduced
+// picture.
+TEST(ConverterChoice, RefusesBadGeometry) {
   Fixture bad(0);
   EXPECT_EQ(bad.select(8, 8, 8, 8), 201);
   Fixture empty(kColourGrey);
