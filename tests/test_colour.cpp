@@ -253,6 +253,20 @@ TEST(ConverterChoice, RefusesBadGeometry) {
   EXPECT_EQ(vj_select_converter(empty.d.get()), 201);
 }
 
+// Calls wider than the visible width (the row length of a buffer larger
+// than the picture) are clipped to it.
+TEST(Cursor, WideCallsAreClippedToTheVisibleWidth) {
+  Fixture f(kColourYcc);
+  ASSERT_EQ(f.select(5, 2, 5, 2), 200);
+  Canvas canvas = f.attach(7);
+  Planes s(3, 16, 2, 21);
+  const uint8_t* row0[3] = {s.row(0, 0), s.row(1, 0), s.row(2, 0)};
+  VETAJ_YcbcrWriteOutput1to1(f.d.get(), row0, 12);
+  VETAJ_YcbcrWriteOutput1to1_YUV444_toRGBA8888(f.d.get(), s.row(0, 1), nullptr, s.row(1, 1),
+                                               s.row(2, 1), 12);
+  EXPECT_TRUE(canvas.holds(source_colours(kColourYcc, s)));
+}
+
 // ---------------------------------------------------------------------------
 // Region decoding: the first column is region_left AND the mask of the path
 // code; the rows outside the window are consumed without output.
