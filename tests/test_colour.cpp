@@ -177,25 +177,6 @@ TEST(ColourEquations, GridsMatchFixedPointReferences) {
   });
 }
 
-// Values worked out by hand: the 565 and BGRA byte orders and the rounding
-// of the YCbCr and CMYK equations.
-TEST(ColourEquations, KnownValues) {
-  auto one_pixel = [](int space, int format, std::vector<uint8_t> samples) {
-    Fixture f(space);
-    f.select(1, 1, 1, 1);
-    Canvas canvas = f.attach(format, 0, 0, 0);
-    Planes s(int(samples.size()), 1, 1, 0);
-    for (size_t c = 0; c < samples.size(); ++c) s.p[c][0] = samples[c];
-    f.feed(s);
-    return std::vector<uint8_t>(canvas.buf.begin(), canvas.buf.begin() + pixel_bytes(format));
-  };
-  using Bytes = std::vector<uint8_t>;
-  EXPECT_EQ(one_pixel(kColourYcc, 0, {128, 128, 128}), (Bytes{0x10, 0x84}));
-  EXPECT_EQ(one_pixel(kColourYcc, 7, {100, 0, 128}), (Bytes{100, 144, 0, 255}));
-  EXPECT_EQ(one_pixel(kColourCmyk, 7, {128, 64, 0, 255}), (Bytes{128, 64, 0, 255}));
-  EXPECT_EQ(one_pixel(kColourRgb, 8, {1, 2, 3}), (Bytes{3, 2, 1, 255}));
-}
-
 // ---------------------------------------------------------------------------
 // Every format and rotation (the fused writers are checked by the whole-
 // picture tests), each colour space at 1:1 and resized over size pairs in
