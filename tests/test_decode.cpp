@@ -5,10 +5,8 @@
 #include <string>
 #include <vector>
 
-#include "VetaJpegDecoder.h"
 #include "support/decoding.h"
 #include "support/files.h"
-#include "support/pictures.h"
 #if VETAJ_HAVE_LIBJPEG
 #include "support/oracle.h"
 #endif
@@ -16,8 +14,6 @@
 namespace {
 
 #if VETAJ_HAVE_LIBJPEG
-
-using vjtest::Colour;
 
 std::vector<std::string> sequential_fixtures() {
   return vjtest::fixtures_where(
@@ -32,30 +28,16 @@ class Sequential : public ::testing::TestWithParam<std::string> {};
 TEST_P(Sequential, FullSizeMatchesLibjpeg) {
   const auto jpeg = vjtest::read_fixture(GetParam());
   vjtest::OracleHeader h;
+  vjtest::FullPicture picture;
   ASSERT_TRUE(vjtest::oracle_header(jpeg, &h));
-  vjtest::OraclePlanes p;
-  ASSERT_TRUE(vjtest::oracle_planes(jpeg, 1, &p));
-  const int space = h.jpeg_color_space;
-  const vjtest::ColourAt colour = [&](int x, int y) -> Colour {
-    const auto v = [&](int c) { return int(p.at(x, y, c)); };
-    switch (space) {
-      case 1: return {false, v(0), v(0), v(0)};                   // grey
-      case 2: return {false, v(0), v(1), v(2)};                   // RGB
-      case 3: return {true, v(0), v(1), v(2)};                    // YCbCr
-      case 4: return vjtest::cmyk_colour(v(0), v(1), v(2), v(3)); // Adobe CMYK, inverted
-      default: return vjtest::ycck_colour(v(0), v(1), v(2), v(3));
-    }
-  };
-  std::vector<int> formats{KOLVAVETA_FMT_RGBA8888};
-  if (space == 3) formats.push_back(KOLVAVETA_FMT_YUV420);
-  for (const int format : formats) {
-    vjtest::DecodeRequest request;
-    request.format = format;
-    request.width = h.width;
-    request.height = h.height;
-    const auto decoded = vjtest::decode_bytes(jpeg, request);
+  ASSERT_TRUE(vjtest::oracle_picture(jpeg, h.jpeg_color_space, &picture));
+  for (const int format : {KOLVAVETA_FMT_RGBA8888, KOLVAVETA_FMT_YUV420}) {
+    if (format == KOLVAVETA_FMT_YUV420 && h.jpeg_color_space != 3) continue;
+    const auto decoded =
+        vjtest::decode_bytes(jpeg, {.format = format, .width = h.width, .height = h.height});
     EXPECT_TRUE(vjtest::shows(
-        decoded, vjtest::Placement::centred(format, h.width, h.height, h.width, h.height), colour))
+        decoded, vjtest::Placement::centred(format, h.width, h.height, h.width, h.height),
+        picture.at))
         << "format " << format;
   }
 }

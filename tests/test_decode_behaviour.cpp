@@ -18,18 +18,10 @@
 #include "support/oracle.h"
 #endif
 
-#if defined(__SANITIZE_ADDRESS__)
-extern "C" size_t __sanitizer_get_current_allocated_bytes(void);
-#endif
-
 namespace {
 
 using namespace vjtest;
 using enum Sampling;
-
-bool all_fill(const std::vector<uint8_t>& bytes) {
-  return std::all_of(bytes.begin(), bytes.end(), [](uint8_t b) { return b == kFill; });
-}
 
 // `picture` resized to out_w x out_h by a sampling rule, centred in a buffer.
 ::testing::AssertionResult shows_picture(const Decoded& d, const FullPicture& picture,
@@ -76,16 +68,6 @@ Bytes without_last_component(Bytes jpeg) {
   return jpeg;
 }
 
-// Heap bytes in use, where the allocator can tell (address sanitizer
-// builds); 0 elsewhere.
-size_t live_heap_bytes() {
-#if defined(__SANITIZE_ADDRESS__)
-  return __sanitizer_get_current_allocated_bytes();
-#else
-  return 0;
-#endif
-}
-
 #if VETAJ_HAVE_LIBJPEG
 
 // ---------------------------------------------------------------------------
@@ -120,29 +102,18 @@ void PrintTo(const PictureCase& c, std::ostream* os) {
 }
 
 // YCbCr outputs of at most 99x99 pixels, and mode 1 within 12/7 of the
-// picture, take centre sampling; other YCbCr outputs, enlargements in modes
-// 0 and 1, and every grey, RGB, CMYK and YCCK picture take the averages.
-// The embedded thumbnails show their own picture (red and blue swapped, a
-// yellow frame), so a decode of the main picture cannot pass for them.
+// picture, take centre sampling; other YCbCr outputs and every grey, RGB,
+// CMYK and YCCK picture take the averages. The embedded thumbnails show
+// their own picture, so a decode of the main picture cannot pass for them.
 const PictureCase kPictureCases[] = {
-    {"sample.jpg", 0x000, 0, 500, 375, 500, 375, 0, kAverage},
-    {"base_420_q90_96x64.jpg", 0x000, 0, 80, 60, 80, 53, 0, kCentre},
-    {"base_420_q90_96x64.jpg", 0x700, 0, 150, 100, 150, 100, 0, kAverage},
-    {"base_420_q90_96x64.jpg", 0x700, 2, 90, 70, 90, 70, 0, kAverage},
     {"base_420_q75_1024x1024.jpg", 0x000, 1, 700, 700, 700, 700, 1, kCentre},
     {"base_420_q75_1024x1024.jpg", 0x000, 0, 700, 700, 700, 700, 0, kAverage},
     {"base_420_q75_1024x1024.jpg", 0x000, 1, 598, 598, 598, 598, 1, kCentre},
     {"base_420_q75_1024x1024.jpg", 0x000, 1, 597, 597, 597, 597, 1, kAverage},
     {"base_420_q90_1024x768.jpg", 0x000, 1, 700, 525, 700, 525, 0, kAverage},
     {"base_422_q70_100x75.jpg", 0x700, 0, 77, 60, 77, 60, 0, kCentre},
-    {"base_422_q70_100x75.jpg", 0x700, 0, 130, 90, 130, 90, 0, kAverage},
-    {"base_444_q95_63x65.jpg", 0x000, 0, 50, 50, 48, 50, 0, kCentre},
     {"base_mixed_y22_cb12_cr21_q85_64x48.jpg", 0x700, 0, 50, 40, 50, 40, 0, kCentre},
     {"grey_q100_40x30.jpg", 0x700, 0, 33, 25, 33, 25, 0, kAverage},
-    {"grey_q100_40x30.jpg", 0x700, 0, 70, 50, 70, 50, 0, kAverage},
-    {"rgb_adobe_q90_64x48.jpg", 0x700, 0, 50, 37, 50, 37, 0, kAverage},
-    {"rgb_adobe_q90_64x48.jpg", 0x700, 0, 90, 60, 90, 60, 0, kAverage},
-    {"cmyk_adobe_444_q90_64x48.jpg", 0x700, 0, 100, 70, 100, 70, 0, kAverage},
     {"cmyk_adobe_2x2_q85_64x48.jpg", 0x700, 0, 40, 30, 40, 30, 0, kAverage},
     {"ycck_adobe_y22_k22_q85_63x65.jpg", 0x700, 0, 40, 50, 40, 50, 0, kAverage},
     // Pictures narrower or lower than 1024 pixels, and every picture whose
@@ -150,37 +121,24 @@ const PictureCase kPictureCases[] = {
     // mode asked.
     {"base_420_q90_96x64.jpg", 0x000, 3, 96, 64, 96, 64, 0, kCentre},
     {"base_420_q81_1023x17.jpg", 0x000, 4, 1023, 17, 1023, 17, 0, kCentre},
-    {"base_420_q88_17x1023.jpg", 0x000, 2, 17, 1023, 17, 1023, 0, kCentre},
     {"base_420_q75_1024x1024.jpg", 0x001, 1, 700, 700, 700, 700, 0, kAverage},
     // A sample size makes the target the picture divided by it, limited to
     // the buffer.
     {"base_420_q90_96x64.jpg", 0x001, 0, 200, 100, 96, 64, 0, kCentre, 0, 0, 1},
-    {"base_420_q90_96x64.jpg", 0x001, 0, 80, 80, 80, 53, 0, kCentre, 0, 0, 1},
     // Exif thumbnail of 160x120: used when it covers the request.
-    {"exif_thumb_ii_640x480.jpg", 0x000, 0, 160, 120, 160, 120, 0, kCentre, 160, 120},
-    {"exif_thumb_ii_640x480.jpg", 0x003, 0, 160, 120, 160, 120, 0, kCentre, 160, 120},
     {"exif_thumb_ii_640x480.jpg", 0x000, 0, 150, 100, 133, 100, 0, kCentre, 160, 120},
     {"exif_thumb_ii_640x480.jpg", 0x000, 0, 480, 360, 480, 360, 0, kAverage},
-    {"exif_thumb_ii_640x480.jpg", 0x001, 0, 400, 300, 400, 300, 0, kAverage},
-    // Policy 2 takes the thumbnail whatever its size: smaller than the
-    // request, it is decoded at its own size.
-    {"exif_thumb_ii_640x480.jpg", 0x002, 0, 400, 300, 160, 120, 0, kCentre, 160, 120},
-    // Stretched, the thumbnail is enlarged by centre sampling (thumbnails
-    // decode in the fast mode).
-    {"exif_thumb_ii_640x480.jpg", 0x702, 0, 330, 250, 330, 250, 0, kCentre, 160, 120},
     {"exif_thumb_mm_320x240.jpg", 0x000, 0, 80, 60, 80, 60, 0, kCentre, 80, 60},
-    {"exif_thumb_mm_320x240.jpg", 0x000, 0, 200, 150, 200, 150, 0, kAverage},
-    {"exif_thumb_mm_320x240.jpg", 0x002, 0, 200, 150, 80, 60, 0, kCentre, 80, 60},
     {"thumb_jfxx_jpeg_128x96.jpg", 0x000, 0, 32, 24, 32, 24, 0, kCentre, 32, 24},
-    {"thumb_jfxx_jpeg_128x96.jpg", 0x000, 0, 100, 75, 100, 75, 0, kAverage},
+    // Policy 2 takes the thumbnail whatever its size: smaller than the
+    // request, it is decoded at its own size; stretched, it is enlarged by
+    // centre sampling (thumbnails decode in the fast mode).
+    {"exif_thumb_ii_640x480.jpg", 0x002, 0, 400, 300, 160, 120, 0, kCentre, 160, 120},
+    {"exif_thumb_ii_640x480.jpg", 0x702, 0, 330, 250, 330, 250, 0, kCentre, 160, 120},
     // An image-resource thumbnail must be strictly larger than the request.
-    {"thumb_app13_jpeg_640x480.jpg", 0x000, 0, 150, 100, 133, 100, 0, kCentre, 160, 120},
     {"thumb_app13_jpeg_640x480.jpg", 0x000, 0, 159, 119, 159, 119, 0, kCentre, 160, 120},
-    {"thumb_app13_jpeg_640x480.jpg", 0x002, 0, 400, 300, 160, 120, 0, kCentre, 160, 120},
     // Uncompressed thumbnails are never decoded: the main picture is.
     {"thumb_jfxx_rgb_128x96.jpg", 0x002, 0, 128, 96, 128, 96, 0, kCentre},
-    {"thumb_jfxx_pal_128x96.jpg", 0x003, 0, 128, 96, 128, 96, 0, kCentre},
-    {"thumb_jfif_rgb4x3_64x48.jpg", 0x002, 0, 64, 48, 64, 48, 0, kCentre},
     {"thumb_jfif_rgb4x3_64x48.jpg", 0x003, 0, 64, 48, 64, 48, 0, kCentre},
 };
 
@@ -245,7 +203,7 @@ TEST(Thumbnails, BrokenThumbnailFallsBackToTheMainPicture) {
 TEST(Thumbnails, OrientedPolicyTurnsALandscapeThumbnailOfAPortraitPicture) {
   const Pictures p = load_with_thumbnail("exif_thumb_portrait_ii_240x320.jpg", 80, 60);
   const ColourAt fitted = resampled(p.thumb.at, kCentre, 0, 0, 80, 60, 60, 45);
-  for (const int format : {KOLVAVETA_FMT_RGBA8888, KOLVAVETA_FMT_RGB565, KOLVAVETA_FMT_RGB565_B}) {
+  for (const int format : {KOLVAVETA_FMT_RGBA8888, KOLVAVETA_FMT_RGB565}) {
     for (const int w : {45, 50}) {
       const Decoded d = decode_bytes(
           p.file,
@@ -287,12 +245,9 @@ TEST(Thumbnails, SampleSizeSelectsTheThumbnail) {
   for (const uint32_t sample : {2u, 0u}) {
     const int scale = sample == 2 ? 2 : 1;
     const Decoded d = decode_on(
-        o.get(),
-        {.width = 320 * scale, .height = 240 * scale, .options = 0, .sample_size = sample});
-    EXPECT_EQ(d.ok, 1);
+        o.get(), {.width = 320 * scale, .height = 240 * scale, .options = 0, .sample_size = sample});
+    EXPECT_EQ(d.ok * 1000000 + d.output_width * 1000 + d.output_height, 1320240);
     EXPECT_EQ(d.sample_size, sample);
-    EXPECT_EQ(d.output_width, 320);
-    EXPECT_EQ(d.output_height, 240);
     EXPECT_EQ(d.image_width, 640);
   }
 }
@@ -304,11 +259,9 @@ TEST(Thumbnails, SampleSizeSelectsTheThumbnail) {
 // decode without the option, leave it upright. The object reports the
 // rotation among its options and keeps the options it was given.
 TEST(Orientation, RotatesByTheTagAndKeepsTheBits) {
-  for (const char* fixture :
-       {"exif_orient1_ii_48x32.jpg", "exif_orient2_ii_48x32.jpg", "exif_orient3_ii_48x32.jpg",
-        "exif_orient4_ii_48x32.jpg", "exif_orient5_ii_48x32.jpg", "exif_orient6_ii_48x32.jpg",
-        "exif_orient7_ii_48x32.jpg", "exif_orient8_ii_48x32.jpg", "exif_orient3_mm_48x32.jpg",
-        "exif_orient6_mm_48x32.jpg", "exif_orient8_mm_48x32.jpg"}) {
+  for (const char* fixture : {"exif_orient2_ii_48x32.jpg", "exif_orient3_ii_48x32.jpg",
+                              "exif_orient5_ii_48x32.jpg", "exif_orient6_mm_48x32.jpg",
+                              "exif_orient8_ii_48x32.jpg"}) {
     const int tag = fixture[11] - '0';  // exif_orientN_...
     const uint32_t rotation = tag == 6 ? 4u : tag == 8 ? 12u : tag == 3 ? 8u : 0u;
     const Bytes jpeg = read_fixture(fixture);
@@ -367,53 +320,40 @@ Object object_with_progress(const Bytes& jpeg, CallLog* log) {
   return o;
 }
 
+// The check callback receives the rows written so far; the progress
+// callback fires on every third check with 100 * rows / output height, so
+// the percentage stays within 0..100 when the picture is resized or cropped.
+// The throttle counter is process-wide: it carries over between decodes.
 TEST(Progress, FiresOnEveryThirdCheckWithThePercentage) {
-  const Bytes jpeg = read_fixture("base_420_q88_17x1023.jpg");
-  CallLog first, second;
-  const Object o = object_with_progress(jpeg, &first);
-  const Decoded a = decode_on(o.get(), {.width = 17, .height = 1023});
-  g_log = &second;
-  o->progress->progress_user = &second;
-  const Decoded b = decode_on(o.get(), {.width = 17, .height = 1023});
-  ASSERT_EQ(a.ok + b.ok, 2);
-  EXPECT_EQ(a.buffer, b.buffer);
-  for (const CallLog* log : {&first, &second}) {
-    ASSERT_GE(log->check_rows.size(), 40u);  // one check per iMCU row
-    ASSERT_FALSE(log->fired_at.empty());
-    // The throttle counter is process-wide: the first call fires once it
-    // reaches 3, then every third call.
-    EXPECT_LE(log->fired_at[0], 3u);
-    for (size_t i = 0; i < log->fired_at.size(); ++i) {
-      EXPECT_TRUE(i == 0 || log->fired_at[i] - log->fired_at[i - 1] == 3) << i;
-      EXPECT_EQ(log->percents[i],
-                int32_t(100 * uint32_t(log->check_rows[log->fired_at[i]]) / 1023));
-    }
-    EXPECT_TRUE(std::is_sorted(log->check_rows.begin(), log->check_rows.end()));
-  }
-  // The counter carries over: after the last firing of the first decode it
-  // counted the remaining calls.
-  EXPECT_EQ(second.fired_at[0], 2 - (first.check_rows.size() - 1 - first.fired_at.back()));
-}
-
-// The check callback receives the rows written so far, so the percentage
-// stays within 0..100 when the picture is resized or cropped.
-TEST(Progress, PercentagesFollowTheOutputRows) {
-  const Bytes jpeg = read_fixture("base_420_q90_1024x768.jpg");
-  for (const auto& [w, h, fit] : {std::tuple{700, 525, KOLVAVETA_OPT_FIT_CENTRE},
-                                  std::tuple{1000, 600, KOLVAVETA_OPT_FIT_FILL},
-                                  std::tuple{1100, 900, KOLVAVETA_OPT_FIT_STRETCH}}) {
-    SCOPED_TRACE(testing::Message() << w << "x" << h);
-    CallLog log;
-    const Object o = object_with_progress(jpeg, &log);
-    const Decoded d = decode_on(
-        o.get(),
-        {.format = 0, .width = w, .height = h, .options = KOLVAVETA_OPT_THUMB_NEVER | fit});
+  const Bytes tall = read_fixture("base_420_q88_17x1023.jpg");
+  const Bytes large = read_fixture("base_420_q90_1024x768.jpg");
+  const uint32_t never = KOLVAVETA_OPT_THUMB_NEVER;
+  const std::pair<const Bytes*, DecodeRequest> runs[] = {
+      {&tall, {.width = 17, .height = 1023}},
+      {&large, {.format = 0, .width = 700, .height = 525}},
+      {&large, {.format = 0, .width = 1000, .height = 600, .options = never | 0x300}},
+      {&large, {.format = 0, .width = 1100, .height = 900, .options = never | 0x700}},
+      {&tall, {.width = 17, .height = 1023}}};
+  CallLog logs[std::size(runs)];
+  for (size_t r = 0; r < std::size(runs); ++r) {
+    SCOPED_TRACE(r);
+    const CallLog& log = logs[r];
+    const Object o = object_with_progress(*runs[r].first, &logs[r]);
+    const Decoded d = decode_on(o.get(), runs[r].second);
     ASSERT_EQ(d.ok, 1);
-    ASSERT_FALSE(log.percents.empty());
+    ASSERT_GE(log.fired_at.size(), 5u);
     EXPECT_TRUE(std::is_sorted(log.check_rows.begin(), log.check_rows.end()));
-    EXPECT_LE(log.check_rows.back(), std::min(h, d.output_height));
-    EXPECT_LE(*std::max_element(log.percents.begin(), log.percents.end()), 100);
+    EXPECT_LE(log.check_rows.back(), std::min(runs[r].second.height, d.output_height));
     EXPECT_GE(log.percents.back(), 50);
+    if (r == 0)
+      EXPECT_LE(log.fired_at[0], 3u);
+    else
+      EXPECT_EQ(log.fired_at[0], 2 - (logs[r - 1].check_rows.size() - 1 - logs[r - 1].fired_at.back()));
+    for (size_t i = 0; i < log.fired_at.size(); ++i) {
+      EXPECT_TRUE(i == 0 || log.fired_at[i] - log.fired_at[i - 1] == 3) << i;
+      EXPECT_EQ(log.percents[i], int32_t(100 * uint32_t(log.check_rows[log.fired_at[i]]) /
+                                         uint32_t(d.output_height)));
+    }
   }
 }
 
@@ -426,28 +366,19 @@ int32_t refusing_check(DecInfo*, int32_t) { return 0; }
 TEST(Cancel, AbortsLeaveTheObjectReusable) {
   const Bytes jpeg = read_fixture("base_420_q88_17x1023.jpg");
   const Decoded reference = decode_bytes(jpeg, {.width = 17, .height = 1023});
-  ASSERT_EQ(reference.ok, 1);
-  enum class Abort { kProgress, kCancelFlag, kCheck };
-  for (const Abort abort : {Abort::kProgress, Abort::kCancelFlag, Abort::kCheck}) {
-    SCOPED_TRACE(int(abort));
+  for (const int abort : {0, 1, 2}) {  // progress refuses, cancel flag, check refuses
+    SCOPED_TRACE(abort);
     CallLog log;
     const Object o = object_with_progress(jpeg, &log);
-    log.progress_result = abort == Abort::kProgress ? 0 : 1;
-    log.stop_after_check = abort == Abort::kCancelFlag ? 3 : -1;
-    if (abort == Abort::kCheck) o->check_callback = refusing_check;
+    log.progress_result = abort == 0 ? 0 : 1;
+    log.stop_after_check = abort == 1 ? 3 : -1;
+    if (abort == 2) o->check_callback = refusing_check;
     EXPECT_EQ(decode_on(o.get(), {.width = 17, .height = 1023}).ok, 0);
-    if (abort == Abort::kProgress) {
-      EXPECT_EQ(log.fired_at.size(), 1u);
-      EXPECT_LE(log.check_rows.size(), 4u);
-    } else if (abort == Abort::kCancelFlag) {
-      EXPECT_EQ(log.check_rows.size(), 3u);
-    }
-    log.progress_result = 1;
-    log.stop_after_check = -1;
+    EXPECT_LE(log.check_rows.size(), 4u);
+    EXPECT_LE(log.fired_at.size(), 1u);
+    log = CallLog{};
     o->check_callback = logging_check;
-    const Decoded again = decode_on(o.get(), {.width = 17, .height = 1023});
-    EXPECT_EQ(again.ok, 1);
-    EXPECT_EQ(again.buffer, reference.buffer);
+    EXPECT_EQ(decode_on(o.get(), {.width = 17, .height = 1023}).buffer, reference.buffer);
   }
 }
 
@@ -462,9 +393,8 @@ TEST(Cancel, AbortsLeaveTheObjectReusable) {
 TEST(DamagedData, TruncatedData) {
   for (const auto& [fixture, mcu_rows] :
        {std::pair{"base_444_rst_row_q85_48x40.jpg", 8},
-        std::pair{"base_420_opt_rst4_q92_63x65.jpg", 16}, std::pair{"base_444_q90_64x48.jpg", 0},
-        std::pair{"grey_q90_64x48.jpg", 0}, std::pair{"base_422_q85_64x48.jpg", 0},
-        std::pair{"base_420_q92_17x33.jpg", 0}, std::pair{"cmyk_adobe_444_q80_33x17.jpg", 0}}) {
+        std::pair{"base_420_opt_rst4_q92_63x65.jpg", 16}, std::pair{"base_422_q85_64x48.jpg", 0},
+        std::pair{"cmyk_adobe_444_q80_33x17.jpg", 0}}) {
     const Bytes jpeg = read_fixture(fixture);
     int w = 0, h = 0;
     ASSERT_TRUE(frame_size(jpeg, &w, &h));
@@ -501,12 +431,13 @@ TEST(DamagedData, TruncatedData) {
 
 // Every fixture cut at several points and with seeded bit flips (anywhere,
 // or only in the marker segments before the entropy data), through every
-// format, rotation, fit mode and thumbnail policy in turn, at its own size
-// and resized: the decode ends without touching memory outside the buffer
-// (run under the sanitizers).
+// format, rotation, fit mode, decode mode and thumbnail policy in turn, at
+// its own size and at every reduction: the decode ends without touching
+// memory outside the buffer (run under the sanitizers).
 TEST(DamagedData, CutsAndBitFlipsOverTheCorpus) {
   const int formats[] = {0, 1, 2, 5, 7, 8, 9, 4, 12};
   const uint32_t fits[] = {0x000, 0x300, 0x700, 0x100};
+  const std::pair<int, int> scales[] = {{1, 1}, {3, 4}, {1, 2}, {3, 8}, {1, 4}, {1, 8}, {1, 16}};
   std::mt19937 rng(20240611);
   size_t turn = 0;
   std::vector<std::string> files = list_fixtures(".jpg");
@@ -528,13 +459,14 @@ TEST(DamagedData, CutsAndBitFlipsOverTheCorpus) {
         for (int flips = 1 + int(rng() % 8); flips > 0; --flips)
           damaged[rng() % span] ^= uint8_t(1u << (rng() % 8));
       }
-      const bool resized = turn % 2 == 1;
+      const auto [num, den] = scales[turn % std::size(scales)];
       const Decoded d = decode_bytes(
           damaged, {.format = formats[turn % std::size(formats)],
-                    .width = resized ? w * 3 / 4 + 1 : w + int(turn % 3),
-                    .height = resized ? h * 5 / 6 + 1 : h + int(turn % 2),
+                    .width = std::max(1, w * num / den) + (num == den ? int(turn % 3) : 0),
+                    .height = std::max(1, h * num / den) + (num == den ? int(turn % 2) : 0),
                     .options = uint32_t(turn % 16) | fits[turn / 16 % std::size(fits)] |
-                               (turn % 5 == 0 ? KOLVAVETA_OPT_EXIF_ORIENT : 0u)});
+                               (turn % 5 == 0 ? KOLVAVETA_OPT_EXIF_ORIENT : 0u),
+                    .mode = int(turn % 5)});
       ASSERT_TRUE(d.guard_intact) << "variant " << v;
     }
   }
@@ -548,8 +480,7 @@ TEST(DamagedData, FrameSizesThatDoNotMatchTheData) {
   const size_t sof = segment(jpeg, 0xC0);
   for (const auto& [w, h, refused] :
        {std::tuple{0, 64, true}, std::tuple{96, 0, true}, std::tuple{50001, 8, true},
-        std::tuple{8, 50001, true}, std::tuple{65535, 65535, true}, std::tuple{96, 6400, false},
-        std::tuple{4000, 64, false}, std::tuple{50000, 8, false}, std::tuple{1, 1, false},
+        std::tuple{8, 50001, true}, std::tuple{96, 6400, false}, std::tuple{50000, 8, false},
         std::tuple{17, 3, false}, std::tuple{97, 65, false}}) {
     Bytes patched = jpeg;
     patched[sof + 5] = uint8_t(h >> 8);
@@ -580,16 +511,11 @@ TEST(InputKinds, EveryKindAndEveryReuseGivesTheSamePixels) {
        {{.width = 100, .height = 75},
         {.format = 0, .width = 80, .height = 80, .options = 0x108},
         {.format = 2, .width = 50, .height = 90, .options = 0x301},
-        {.format = 8, .width = 120, .height = 120, .options = 0x705},
         {.format = 5, .width = 75, .height = 100, .options = 0x00D},
         {.width = 100, .height = 75}}},
       {"garbage_lead_420_64x48.jpg", {{.width = 64, .height = 48}}},
-      {"grey_rst2_q85_63x65.jpg", {{.format = 2, .width = 63, .height = 65}}},
-      {"cmyk_adobe_2x2_q85_64x48.jpg", {{.width = 64, .height = 48}}},
-      {"sample.jpg", {{.format = 8, .width = 800, .height = 600}}},
       {"exif_thumb_portrait_ii_240x320.jpg",
        {{.format = 0, .width = 45, .height = 60, .options = 3}, {.width = 60, .height = 80}}},
-      {"thumb_app13_jpeg_640x480.jpg", {{.width = 150, .height = 100, .options = 0}}},
   };
   for (const auto& [fixture, requests] : cases) {
     const Bytes jpeg = read_fixture(fixture);
@@ -621,58 +547,47 @@ TEST(InputKinds, EveryKindAndEveryReuseGivesTheSamePixels) {
 // The Adobe transform decides before the component ids (for four
 // components any value but 0 is YCCK), and a JFIF marker before both.
 TEST(ColourSpaces, DetectedFromComponentsAndMarkers) {
-  enum Space { kRgb, kYcc, kCmyk, kYcck };
   struct Case {
     const char* fixture;
     std::vector<uint8_t> ids;  // replacing the component ids, when given
     int transform;             // replacing the Adobe transform, when not -1
-    Space space;
-  } const cases[] = {{"rgb_adobe_q90_64x48.jpg", {1, 2, 3}, -1, kRgb},
-                     {"rgb_adobe_q90_64x48.jpg", {}, 1, kYcc},
-                     {"base_444_q90_64x48.jpg", {'R', 'G', 'B'}, -1, kYcc},
-                     {"cmyk_adobe_444_q90_64x48.jpg", {}, 2, kYcck},
-                     {"ycck_adobe_444_q90_64x48.jpg", {}, 1, kYcck},
-                     {"ycck_adobe_444_q90_64x48.jpg", {}, 0, kCmyk}};
+    int space;                 // 2 RGB, 3 YCbCr, 4 CMYK, 5 YCCK
+  } const cases[] = {{"rgb_adobe_q90_64x48.jpg", {1, 2, 3}, -1, 2},
+                     {"rgb_adobe_q90_64x48.jpg", {}, 1, 3},
+                     {"base_444_q90_64x48.jpg", {'R', 'G', 'B'}, -1, 3},
+                     {"cmyk_adobe_444_q90_64x48.jpg", {}, 2, 5},
+                     {"ycck_adobe_444_q90_64x48.jpg", {}, 1, 5},
+                     {"ycck_adobe_444_q90_64x48.jpg", {}, 0, 4}};
   for (const Case& c : cases) {
     const Bytes jpeg =
         with_adobe_transform(with_component_ids(read_fixture(c.fixture), c.ids), c.transform);
-    OraclePlanes raw;
-    ASSERT_TRUE(oracle_planes(jpeg, 1, &raw));
-    const int w = raw.width, h = raw.height;
-    const Decoded d = decode_bytes(jpeg, {.width = w, .height = h});
-    EXPECT_TRUE(shows(d, Placement::centred(7, w, h, w, h),
-                      [&](int x, int y) {
-                        const auto s = [&](int k) { return int(raw.at(x, y, k)); };
-                        if (c.space <= kYcc) return Colour{c.space == kYcc, s(0), s(1), s(2)};
-                        return (c.space == kCmyk ? cmyk_colour : ycck_colour)(s(0), s(1), s(2),
-                                                                              s(3));
-                      }))
+    FullPicture raw;
+    ASSERT_TRUE(oracle_picture(jpeg, c.space, &raw));
+    const Decoded d = decode_bytes(jpeg, {.width = raw.width, .height = raw.height});
+    EXPECT_TRUE(shows(d, Placement::centred(7, raw.width, raw.height, raw.width, raw.height),
+                      raw.at))
         << c.fixture << " case " << (&c - cases);
   }
 }
 
 #endif  // VETAJ_HAVE_LIBJPEG
 
-// Inputs that cannot decode fail with nothing written and no memory kept.
+// Inputs that cannot decode fail with nothing written and no decoder kept
+// (the sanitizer build's leak check covers the memory).
 // Without the header pre-scan (policy 1) the decoder set-up refuses them
 // with error 2; so it does with the pre-scan for frames whose colour space
 // cannot be decided.
 TEST(Errors, InputsThatCannotDecode) {
   const Bytes good = read_fixture("base_420_q90_96x64.jpg");
-  Bytes png = {0x89, 'P', 'N', 'G', 0x0D, 0x0A, 0x1A, 0x0A, 0,  0, 0, 13, 'I', 'H', 'D',
-               'R',  0,   0,   0,   16,   0,    0,    0,    16, 8, 2, 0,  0,   0};
-  png.resize(200, 0x11);
   std::mt19937 rng(7);
   Bytes noise(4000);
   for (auto& b : noise) b = uint8_t(rng());
   Bytes no_adobe = read_fixture("cmyk_adobe_444_q90_64x48.jpg");
   no_adobe[segment(no_adobe, 0xEE) + 1] = 0xEF;  // an APP15 segment instead
   const std::tuple<const char*, Bytes, bool> cases[] = {
-      {"png", png, false},
       {"noise", noise, false},
       {"header_cut", Bytes(good.begin(), good.begin() + 150), false},
       {"arithmetic", read_fixture("bad_arith_420_64x48.jpg"), false},
-      {"arithmetic_progressive", read_fixture("bad_arith_prog_420_64x48.jpg"), false},
       {"twelve_bit", read_fixture("bad_12bit_sof0_64x48.jpg"), false},
       {"extended_sequential", read_fixture("bad_sof1_420_64x48.jpg"), false},
       {"four_components_without_adobe", no_adobe, true},
@@ -685,15 +600,11 @@ TEST(Errors, InputsThatCannotDecode) {
   for (const auto& [label, jpeg, undecidable] : cases) {
     for (const uint32_t policy : {KOLVAVETA_OPT_THUMB_NEVER, KOLVAVETA_OPT_THUMB_IF_LARGE}) {
       SCOPED_TRACE(testing::Message() << label << " policy " << policy);
-      const size_t before = live_heap_bytes();
-      {
-        const Decoded d = decode_bytes(jpeg, {.width = 64, .height = 48, .options = policy});
-        EXPECT_EQ(d.ok, 0);
-        EXPECT_TRUE(d.error == KOLVAVETA_ERR_SETUP || (!undecidable && policy != 1)) << d.error;
-        EXPECT_FALSE(d.kept_decoder);
-        EXPECT_TRUE(d.guard_intact && all_fill(d.buffer));
-      }
-      EXPECT_EQ(live_heap_bytes(), before);
+      const Decoded d = decode_bytes(jpeg, {.width = 64, .height = 48, .options = policy});
+      EXPECT_EQ(d.ok, 0);
+      EXPECT_TRUE(d.error == KOLVAVETA_ERR_SETUP || (!undecidable && policy != 1)) << d.error;
+      EXPECT_FALSE(d.kept_decoder);
+      EXPECT_TRUE(d.guard_intact && all_fill(d.buffer));
     }
   }
 }

@@ -66,20 +66,29 @@ bool frame_size(const Bytes& jpeg, int* width, int* height) {
   return known;
 }
 
+bool oracle_picture(const Bytes& jpeg, int space, FullPicture* out) {
+#if VETAJ_HAVE_LIBJPEG
+  auto planes = std::make_shared<OraclePlanes>();
+  if (!oracle_planes(jpeg, 1, planes.get())) return false;
+  out->width = planes->width;
+  out->height = planes->height;
+  out->at = [planes, space](int x, int y) {
+    int v[4] = {};
+    for (int c = 0; c < planes->components && c < 4; ++c) v[c] = planes->at(x, y, c);
+    return colour_in(space, v);
+  };
+  return true;
+#else
+  (void)jpeg, (void)space, (void)out;
+  return false;
+#endif
+}
+
 bool full_picture(const Bytes& jpeg, FullPicture* out) {
 #if VETAJ_HAVE_LIBJPEG
   OracleHeader h;
   if (!oracle_header(jpeg, &h)) return false;
-  if (h.jpeg_color_space == 3 /* YCbCr */) {
-    auto planes = std::make_shared<OraclePlanes>();
-    if (!oracle_planes(jpeg, 1, planes.get())) return false;
-    out->width = h.width;
-    out->height = h.height;
-    out->at = [planes](int x, int y) {
-      return Colour{true, planes->at(x, y, 0), planes->at(x, y, 1), planes->at(x, y, 2)};
-    };
-    return true;
-  }
+  if (h.jpeg_color_space == 3 /* YCbCr */) return oracle_picture(jpeg, 3, out);
 #endif
   // Other colour spaces (and every frame when libjpeg is missing): the
   // library's own decode at the size the header summary reports.

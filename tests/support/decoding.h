@@ -1,6 +1,5 @@
 // Whole-image decodes through the public interface, with a guard area behind
-// the output buffer, and the full-size pictures that resized and rotated
-// decodes are compared with.
+// the output buffer, and the full-size pictures they are compared with.
 #ifndef VETAJ_TESTS_SUPPORT_DECODING_H
 #define VETAJ_TESTS_SUPPORT_DECODING_H
 
@@ -47,9 +46,8 @@ struct Decoded {
 };
 
 // Decodes on an existing object after setting its format, options, mode and
-// sample size.
+// sample size; or a memory image on a fresh object.
 Decoded decode_on(DecInfo* object, const DecodeRequest& request);
-// Decodes a memory image on a fresh object.
 Decoded decode_bytes(const Bytes& jpeg, const DecodeRequest& request);
 
 // The decode succeeded, wrote nothing behind its buffer and left exactly the
@@ -60,14 +58,16 @@ Decoded decode_bytes(const Bytes& jpeg, const DecodeRequest& request);
 // The frame size from the header summary; false when there is none.
 bool frame_size(const Bytes& jpeg, int* width, int* height);
 
-// The whole picture of a stream at full size: YCbCr frames as libjpeg's
-// samples (box upsampling), other colour spaces as the library's own
-// full-size RGBA decode (compared with libjpeg by the decode tests; without
-// libjpeg YCbCr frames come from it too).
 struct FullPicture {
   int width = 0, height = 0;
   ColourAt at;
 };
+// The picture of libjpeg's full-size samples (box upsampling) under the
+// colour space given (colour_in).
+bool oracle_picture(const Bytes& jpeg, int space, FullPicture* out);
+// The whole picture at full size: YCbCr frames from libjpeg, other colour
+// spaces (and every frame without libjpeg) the library's own RGBA decode,
+// which the decode tests compare with libjpeg.
 bool full_picture(const Bytes& jpeg, FullPicture* out);
 
 }  // namespace vjtest

@@ -24,8 +24,6 @@ void store_pixel(int format, const Colour& rgb, uint8_t* at) {
     at[i] = uint8_t(value[std::strchr(kLetters, order[i]) - kLetters]);
 }
 
-}  // namespace
-
 Colour rgb_of(const Colour& c) {
   if (!c.ycc) return c;
   const int64_t cb = c.b - 128, cr = c.c - 128;
@@ -52,6 +50,14 @@ Colour ycck_colour(int y, int cb, int cr, int k) {
   return {false, int(K * clamp255(433 - Y - ((91881 * int64_t(cr)) >> 16)) >> 8),
           int(K * clamp255(120 - Y - ((-22554 * int64_t(cb) - 46802 * int64_t(cr)) >> 16)) >> 8),
           int(K * clamp255(481 - Y - ((116130 * int64_t(cb)) >> 16)) >> 8)};
+}
+
+}  // namespace
+
+Colour colour_in(int space, const int* v) {
+  if (space == 1) return {false, v[0], v[0], v[0]};
+  if (space <= 3) return {space == 3, v[0], v[1], v[2]};
+  return (space == 4 ? cmyk_colour : ycck_colour)(v[0], v[1], v[2], v[3]);
 }
 
 int pixel_bytes(int format) {
@@ -114,6 +120,10 @@ std::vector<uint8_t> expected_buffer(const Placement& p, const ColourAt& colour)
     }
   }
   return out;
+}
+
+bool all_fill(const std::vector<uint8_t>& bytes) {
+  return std::all_of(bytes.begin(), bytes.end(), [](uint8_t b) { return b == kFill; });
 }
 
 ::testing::AssertionResult same_output(const std::vector<uint8_t>& actual,

@@ -23,14 +23,12 @@ struct Colour {
   bool ycc = false;
   int a = 0, b = 0, c = 0;
 };
-// YCbCr to RGB with 16-bit constants and arithmetic shifts; RGB to YCbCr
-// with 12-bit constants (the planar writers of RGB sources).
-Colour rgb_of(const Colour& colour);
-Colour ycc_of(const Colour& colour);
-// CMYK (not inverted) as RGB: each channel times K / 255. YCCK: the inverted
-// YCbCr equations, times K / 256.
-Colour cmyk_colour(int c, int m, int y, int k);
-Colour ycck_colour(int y, int cb, int cr, int k);
+// The colour of a pixel from its component samples under a colour space
+// (1 grey, 2 RGB, 3 YCbCr, 4 CMYK not inverted, 5 YCCK). Writers convert
+// YCbCr with 16-bit constants and arithmetic shifts, RGB to YCbCr (planar
+// output of other spaces) with 12-bit constants; CMYK is each channel times
+// K / 255, YCCK the inverted YCbCr equations times K / 256.
+Colour colour_in(int space, const int* samples);
 
 // Colour of output pixel (x, y) before rotation.
 using ColourAt = std::function<Colour(int x, int y)>;
@@ -61,6 +59,9 @@ struct Placement {
 // the pixels at even output coordinates (unrotated) or at even buffer
 // coordinates (rotated).
 std::vector<uint8_t> expected_buffer(const Placement& where, const ColourAt& colour);
+
+// Every byte still holds kFill.
+bool all_fill(const std::vector<uint8_t>& bytes);
 
 // Compares two buffers, naming the first differing byte.
 ::testing::AssertionResult same_output(const std::vector<uint8_t>& actual,
