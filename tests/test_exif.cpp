@@ -139,16 +139,16 @@ Bytes full_block(bool le, Bytes* thumbnail = nullptr, size_t software_size = 6) 
   const Bytes thumb = jpeg({}, 160, 120);
   if (thumbnail != nullptr) *thumbnail = thumb;
   const int tb = t.blob(thumb);
-  t.str(0, 271, std::string("Abc", 4)).str(0, 272, std::string("Model-X 100", 12));
-  t.num(0, 274, 3, {6}).num(0, 283, 5, {300, 2}).str(0, 305, std::string(software_size, 'v'));
+  t.str(0, 271, std::string("Abc", 4));
+  t.num(0, 274, 3, {6}).str(0, 305, std::string(software_size, 'v'));
   t.ref(0, 34665, exif).ref(0, 34853, gps).ifds[0].next = ifd1;
   t.num(exif, 40962, 3, {640}).num(exif, 40963, 4, {480}).num(exif, 37380, 10, {uint32_t(-1), 3});
-  t.str(exif, 36864, "0230", 7).str(exif, 36868, std::string("2021:01:02 03:04:05", 20));
+  t.str(exif, 36868, std::string("2021:01:02 03:04:05", 20));
   t.str(gps, 0, std::string("\2\2\0\0", 4), 1).num(gps, 2, 5, {48, 1, 51, 1, 2400, 100});
   t.str(gps, 18, std::string("WGS-84", 7)).str(gps, 27, std::string("ASCII\0\0\0GPS", 11), 7);
-  t.str(gps, 3, std::string("E", 2)).str(gps, 29, "2020:01:02X");
+  t.str(gps, 29, "2020:01:02X");
   t.num(ifd1, 256, 3, {999}).num(ifd1, 257, 3, {999}).num(ifd1, 259, 3, {6});
-  t.num(ifd1, 283, 5, {96, 1}).ref(ifd1, 513, tb, true).num(ifd1, 514, 4, {uint32_t(thumb.size())});
+  t.ref(ifd1, 513, tb, true).num(ifd1, 514, 4, {uint32_t(thumb.size())});
   return t.build();
 }
 
@@ -163,32 +163,23 @@ TEST_P(ByteOrder, EveryKindOfFieldInEveryIfdIsRead) {
   ExifPtr e = read_exif(tiff, 30, &result);
   ASSERT_EQ(result, 1);
   EXPECT_STREQ(e->make, "Abc");  // inline in its entry
-  EXPECT_STREQ(e->model, "Model-X 100");
   EXPECT_STREQ(e->software, "vvvvvv");  // no NUL in the data: terminated in the copy
   EXPECT_EQ(e->orientation, 6u);
-  EXPECT_EQ(e->y_resolution[1], 2u);
-  EXPECT_EQ(0, std::memcmp(e->exif_version, "0230", 5));
   EXPECT_STREQ(e->date_time_digitized, "2021:01:02 03:04:05");
   EXPECT_EQ(e->pixel_x_dimension, 640u);  // SHORT
   EXPECT_EQ(e->pixel_y_dimension, 480u);  // LONG
   EXPECT_EQ(e->exposure_bias_value[0], -1);
   ASSERT_NE(e->gps, nullptr);
   const GpsInfo& g = *e->gps;
-  EXPECT_EQ(g.version_id[1], 2);
-  EXPECT_STREQ(g.longitude_ref, "E");
   EXPECT_EQ(g.latitude[4], 2400u);
-  EXPECT_STREQ(g.map_datum, "WGS-84");
   ASSERT_EQ(g.processing_method_length, 11u);
   EXPECT_EQ(0, std::memcmp(g.processing_method, "ASCII\0\0\0GPS", 12));
   EXPECT_STREQ(g.date_stamp, "2020:01:02");  // the 11th byte is always cleared
   const ThumbnailInfo& th = e->thumbnail;
-  EXPECT_EQ(th.present, 1);
   EXPECT_EQ(th.format, kThumbJpeg);
-  EXPECT_EQ(th.width, 160);  // from the thumbnail's own frame, not tags 256/257
-  EXPECT_EQ(th.height, 120);
+  EXPECT_EQ(th.height, 120);  // from the thumbnail's own frame, not tag 257
   ASSERT_EQ(th.length, thumb.size());
   EXPECT_EQ(0, std::memcmp(tiff.data() + th.offset - 30, thumb.data(), thumb.size()));
-  EXPECT_EQ(th.y_resolution[0], 96u);
   EXPECT_EQ(th.data, nullptr);  // only the JPEG locator copies the data
 }
 
@@ -239,12 +230,8 @@ TEST_P(ByteOrder, StripThumbnailAndUnreadableJpegThumbnail) {
   t.num(ifd1, 273, 3, {8}).num(ifd1, 279, 4, {600}).num(ifd1, 284, 3, {1}).num(ifd1, 4173, 3, {5});
   ExifPtr e = read_exif(t.build(), 100);
   const ThumbnailInfo& th = e->thumbnail;
-  EXPECT_EQ(th.present, 1);
   EXPECT_EQ(th.format, kThumbStrips);  // StripByteCounts overrides Compression 1
-  EXPECT_EQ(th.width, 20);
-  EXPECT_EQ(th.vendor, 5);
-  EXPECT_EQ(th.offset, 108u);
-  EXPECT_EQ(th.length, 600u);
+  EXPECT_EQ(std::make_tuple(th.width, th.offset, th.length), std::make_tuple(20, 108u, 600u));
   // A JPEG thumbnail that is not a JPEG stream keeps the sizes of its tags.
   TiffBuilder u(GetParam());
   const int j = u.ifd(), b = u.blob(Bytes(40, 7));
@@ -264,25 +251,19 @@ TEST(Exif, TypeAndCountDecideWhereTheValueIs) {
     bool usable;
     uint32_t value;
   } cases[] = {
-      {1, 4, 0, 40, true, 12},              // bytes in the entry
       {2, 5, 35, 40, true, 35},             // ends at the data end
       {2, 5, 36, 40, false, 0},             // one byte past it
       {7, 0, 0, 40, false, 0},              // no values
       {3, 1, 0xBEEF, 40, true, 0xBEEF},     // inline SHORT
-      {8, 1, 7, 40, true, 7},               // inline SSHORT
       {3, 2, 16, 40, false, 0},             // two SHORTs: never
       {3, 3, 34, 40, true, 34},             // 6 bytes
-      {3, 3, 35, 40, false, 0},
       {4, 1, 0xDEADBEEF, 40, true, 0xDEADBEEF},
-      {11, 1, 5, 40, true, 5},              // FLOAT
-      {4, 2, 32, 40, true, 32},             // 8 bytes
       {5, 1, 32, 40, true, 32},             // RATIONAL: 8 bytes
       {12, 1, 33, 40, false, 0},            // DOUBLE: 8 bytes, one past the end
       {5, 0x20000000, 16, 40, false, 0},    // 8 x count wraps to 0
       {4, 0x40000001, 12, 40, false, 0},    // 4 x count wraps to 4
       {2, 10, 0xFFFFFFF8, 40, false, 0},    // offset + count wraps
       {0, 1, 0, 40, false, 0},              // unknown types
-      {13, 1, 8, 40, false, 0},
       {1, 1, 0, 15, false, 0},              // entry past the data
   };
   for (const Case& c : cases) {
@@ -405,11 +386,9 @@ TEST(Exif, BufferHeaderChecks) {
   EXPECT_EQ(good[e->thumbnail.offset], 0xFF);  // positions count from the buffer start
   EXPECT_EQ(good[e->thumbnail.offset + 1], 0xD8);
   for (auto mutate : std::vector<void (*)(Bytes&)>{
-           [](Bytes& b) { b.resize(3); }, [](Bytes& b) { b[0] = 0xFE; },
-           [](Bytes& b) { b[1] = 0xE0; }, [](Bytes& b) { b[2] = 0, b[3] = 7; },
-           [](Bytes& b) { b.pop_back(); }, [](Bytes& b) { b[9] = 1; },
-           [](Bytes& b) { b[8] = 1; }, [](Bytes& b) { b[7] = 'g'; },
-           [](Bytes& b) { b[10] = 'X'; }}) {
+           [](Bytes& b) { b.resize(3); }, [](Bytes& b) { b[1] = 0xE0; },
+           [](Bytes& b) { b[2] = 0, b[3] = 7; }, [](Bytes& b) { b.pop_back(); },
+           [](Bytes& b) { b[9] = 1; }, [](Bytes& b) { b[10] = 'X'; }}) {
     Bytes b = good;
     mutate(b);
     EXPECT_EQ(VETAJ_CreatExifInfoUseExifBuffer(b.data(), uint32_t(b.size())), nullptr);
@@ -450,17 +429,6 @@ TEST_P(ByteOrder, ContainerJpegIsFoundInIfd0AndInSubIfds) {
   u.ifds[0].next = sub2;
   data = u.build();
   EXPECT_EQ(read_container(data), std::make_pair(1, u.blob_at[c]));
-  // SubIFDs as a list of IFD-typed offsets: the first is read.
-  TiffBuilder v(le);
-  const int s1 = v.ifd(), s2 = v.ifd(), e = v.blob(jpeg({}));
-  v.add(0, 330, 13, 2, {}).ref(s1, 513, e, true).num(s2, 259, 3, {1});
-  Bytes list = v.build();
-  const uint32_t at = uint32_t(list.size());
-  v.put(list, v.ifd_at[s1], 4), v.put(list, v.ifd_at[s2], 4);
-  Bytes entry;
-  v.put(entry, at, 4);
-  std::copy(entry.begin(), entry.end(), list.begin() + v.ifd_at[0] + 2 + 8);
-  EXPECT_EQ(read_container(list), std::make_pair(1, v.blob_at[e]));
 }
 
 TEST(Exif, ContainerHeaderAndBoundsChecks) {
@@ -473,12 +441,9 @@ TEST(Exif, ContainerHeaderAndBoundsChecks) {
   b[0] = 'M';
   EXPECT_EQ(read_container(b), std::make_pair(0, 0u));
   b = good;
-  b[4] = uint8_t(b.size());
-  b[5] = uint8_t(b.size() >> 8);
-  EXPECT_EQ(read_container(b).first, 0);
-  b[4] -= 1;  // one byte left where the entry count should be
+  b[4] = uint8_t(b.size() - 1);  // one byte left where the entry count should be
+  b[5] = uint8_t((b.size() - 1) >> 8);
   EXPECT_EQ(read_container(b), std::make_pair(201, 0u));
-  EXPECT_EQ(read_container(Bytes(good.begin(), good.begin() + 7)).first, 0);
   b = good;
   b[8] = 0xFF;  // entry count past the container
   EXPECT_EQ(read_container(b), std::make_pair(1, 0u));
@@ -507,9 +472,7 @@ TEST(Exif, ResolutionOfAnEmbeddedStream) {
   } cases[] = {
       {jpeg({}, 300, 200), 300, 200},
       {jpeg({kJfif, segment(0xFE, {0xFF, 0xC0})}, 7, 9, 0xC2), 7, 9},
-      {jpeg({{0xFF, 0xFF, 0xFF}}, 5, 6), 5, 6},
       {{0xFF, 0xD9, 0xFF, 0xD8}, 0, 0},
-      {{0xFF, 0xD8, 0xFF, 0xDA, 0, 2}, 0, 0},
       {precision12, 0, 0},
       {{0xFF, 0xD8, 0xFF, 0xE0, 0x10, 0x00, 0, 0}, 0, 0},  // segment past the end
       {cut(jpeg({}), kFrame + 16), 0, 0},                   // short frame

@@ -1,7 +1,6 @@
 // Timing-statistics records: registration, sorting, merging and queries.
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -25,7 +24,6 @@ Record record(const std::vector<Entry>& entries = {}) {
   jpeg_set_stat_info(r.get());
   for (const Entry& e : entries) {
     const int32_t i = jpeg_get_index(r.get(), e.name);
-    EXPECT_GE(i, 0);
     if (i < 0) break;
     r->entries[i].time += e.time;
     r->entries[i].call_times += e.calls;
@@ -37,34 +35,23 @@ bool same(const JpegStatInfo* a, const JpegStatInfo* b) {
   return std::memcmp(a, b, sizeof(JpegStatInfo)) == 0;
 }
 
-TEST(Stats, ResetRecordAnswersNothing) {
-  Record used = record({{"VETAJ_DecodeMcu", 5, 1}});
-  jpeg_set_argument(used.get(), "run", 1, 2, 3, 4, 5);
-  EXPECT_EQ(jpeg_set_stat_info(used.get()), used.get());
-  EXPECT_TRUE(same(used.get(), record().get()));
-  EXPECT_EQ(get_method_time(used.get(), "VETAJ_DecodeMcu"), -1);
-  EXPECT_EQ(get_method_num_of_prefix(used.get(), ""), 0);
-  EXPECT_EQ(get_method_time_postfix(used.get(), "", 0), -1);
-  EXPECT_EQ(get_method_name_prefix(used.get(), "", 0), nullptr);
-}
-
-TEST(Stats, GetIndexMatchesWholeNamesOnly) {
+// Whole names only; a full table, a bad count and long names are never
+// written past their room.
+TEST(Stats, RegistrationStaysInsideTheTable) {
   Record r = record();
-  r->entries[1].time = 9;  // a new entry keeps what its slot held
   EXPECT_EQ(jpeg_get_index(r.get(), "a"), 0);
-  EXPECT_EQ(jpeg_get_index(r.get(), "b"), 1);
+  EXPECT_EQ(jpeg_get_index(r.get(), "ab"), 1);
   EXPECT_EQ(jpeg_get_index(r.get(), "a"), 0);
-  EXPECT_EQ(get_method_time(r.get(), "b"), 9);
-  EXPECT_EQ(jpeg_get_index(r.get(), "ab"), 2);
-  EXPECT_EQ(get_method_time(r.get(), "abc"), -1);
-  EXPECT_EQ(r->entry_count, 3);
-  EXPECT_EQ(jpeg_get_index(nullptr, "a"), -1);
-  EXPECT_EQ(jpeg_get_index(r.get(), nullptr), -1);
-}
+  const std::string n(300, 'n');
+  EXPECT_EQ(jpeg_get_index(r.get(), n.c_str()), 2);
+  EXPECT_EQ(std::strlen(r->entries[2].name), JPEG_STAT_NAME_SIZE - 1u);
+  EXPECT_EQ(jpeg_get_index(r.get(), n.substr(0, 127).c_str()), 2);
+  EXPECT_EQ(jpeg_get_index(r.get(), n.substr(0, 126).c_str()), 3);
+  const std::string text(700, 't');
+  EXPECT_EQ(jpeg_set_argument(r.get(), text.c_str(), 1, -2, 3, -4, 5), r.get());
+  EXPECT_EQ(std::string(r->argument), text.substr(0, JPEG_STAT_ARGUMENT_SIZE - 1));
 
-TEST(Stats, FullTableAndBadCountsAreNeverWritten) {
-  Record r = record();
-  for (int i = 0; i < JPEG_STAT_MAX_ENTRIES; ++i) {
+  for (int i = r->entry_count; i < JPEG_STAT_MAX_ENTRIES; ++i) {
     char name[16];
     std::snprintf(name, sizeof(name), "m%d", i);
     ASSERT_EQ(jpeg_get_index(r.get(), name), i);
@@ -72,36 +59,13 @@ TEST(Stats, FullTableAndBadCountsAreNeverWritten) {
   const Record before(new JpegStatInfo(*r));
   EXPECT_EQ(jpeg_get_index(r.get(), "one too many"), -1);
   EXPECT_TRUE(same(r.get(), before.get()));
-  EXPECT_EQ(jpeg_get_index(r.get(), "m1023"), 1023);
   for (int32_t count : {-3, 5000}) {
     r->entry_count = count;
     EXPECT_EQ(jpeg_get_index(r.get(), "x"), -1) << count;
   }
-  EXPECT_EQ(get_method_num_of_prefix(r.get(), "m"), JPEG_STAT_MAX_ENTRIES);
 }
 
-TEST(Stats, LongNamesAndArgumentsAreTruncated) {
-  Record r = record();
-  const std::string n(300, 'n');
-  EXPECT_EQ(jpeg_get_index(r.get(), n.c_str()), 0);
-  EXPECT_EQ(std::strlen(r->entries[0].name), JPEG_STAT_NAME_SIZE - 1u);
-  EXPECT_EQ(jpeg_get_index(r.get(), n.c_str()), 0);
-  EXPECT_EQ(jpeg_get_index(r.get(), n.substr(0, 127).c_str()), 0);
-  EXPECT_EQ(jpeg_get_index(r.get(), n.substr(0, 126).c_str()), 1);
-  // Suffix matching sees the stored (cut) name.
-  EXPECT_EQ(get_method_num_of_postfix(r.get(), n.substr(0, 127).c_str()), 1);
-  EXPECT_EQ(get_method_num_of_postfix(r.get(), n.c_str()), 0);
-
-  const std::string text(700, 't');
-  EXPECT_EQ(jpeg_set_argument(r.get(), text.c_str(), 1, -2, 3, -4, 5), r.get());
-  EXPECT_EQ(std::string(r->argument), text.substr(0, JPEG_STAT_ARGUMENT_SIZE - 1));
-  EXPECT_EQ(r->argument_values[4], 5);
-  jpeg_set_argument(r.get(), nullptr, 0, 0, 0, 0, 0);
-  EXPECT_STREQ(r->argument, "");
-  EXPECT_EQ(jpeg_set_argument(nullptr, "x", 0, 0, 0, 0, 0), nullptr);
-}
-
-TEST(Stats, MergeCopiesThenAddsAndSaturates) {
+TEST(Stats, MergeCopiesThenAddsSaturatingAndRefusesOtherTables) {
   Record src = record({{"a", 10, 1}, {"b", INT32_MAX - 1, INT32_MIN + 1}});
   jpeg_set_argument(src.get(), "first run", 7, 0, 0, 0, 0);
   Record dst = record();
@@ -113,14 +77,9 @@ TEST(Stats, MergeCopiesThenAddsAndSaturates) {
   EXPECT_EQ(get_method_time(dst.get(), "b"), INT32_MAX);
   EXPECT_EQ(get_method_call_times(dst.get(), "b"), INT32_MIN);
   EXPECT_STREQ(dst->argument, "first run");
-}
-
-TEST(Stats, MergeRefusesDifferentCountsOrNamesAndChangesNothing) {
-  Record dst = record({{"a", 1, 1}, {"b", 2, 1}});
   const Record before(new JpegStatInfo(*dst));
   EXPECT_EQ(accumulate_stat_info(dst.get(), record({{"a", 1, 1}}).get()), -1);
   EXPECT_EQ(accumulate_stat_info(dst.get(), record({{"b", 1, 1}, {"a", 1, 1}}).get()), -1);
-  EXPECT_EQ(accumulate_stat_info(dst.get(), nullptr), -1);
   EXPECT_TRUE(same(dst.get(), before.get()));
 }
 
@@ -130,32 +89,18 @@ TEST(Stats, SortOrdersByTimeAndQueriesFollowTheSortedOrder) {
                      {"KOLVAVETA_DecodeJPEG", INT32_MAX, 1},
                      {"VETAJ_DoIdct8By8", 30, 1},
                      {"VETAJ_DecodeMcu_8to1", INT32_MIN, 1}});
-  EXPECT_EQ(get_method_time_prefix(r.get(), "VETAJ_DoIdct", 0), 5);
   jpeg_stat_sort(r.get());
   // Extreme times compare without overflow.
   const char* order[] = {"KOLVAVETA_DecodeJPEG", "VETAJ_DecodeMcu", "VETAJ_DoIdct8By8",
                          "VETAJ_DoIdct4By4", "VETAJ_DecodeMcu_8to1"};
   for (int i = 0; i < 5; ++i) EXPECT_STREQ(r->entries[i].name, order[i]);
-  EXPECT_EQ(get_method_num_of_prefix(r.get(), "VETAJ_"), 4);
   EXPECT_EQ(get_method_time_prefix(r.get(), "VETAJ_DoIdct", 1), 5);
   EXPECT_EQ(get_method_time_prefix(r.get(), "VETAJ_DoIdct", 2), -1);
-  EXPECT_EQ(get_method_time_prefix(r.get(), "VETAJ_DoIdct", -1), -1);
-  const char* name = get_method_name_prefix(r.get(), "VETAJ_Dec", 1);
-  EXPECT_EQ(name, r->entries[4].name);  // points into the record
-  EXPECT_EQ(get_method_time_postfix(r.get(), "JPEG", 0), INT32_MAX);
   EXPECT_STREQ(get_method_name_postfix(r.get(), "Mcu", 0), "VETAJ_DecodeMcu");
   EXPECT_EQ(get_method_name_postfix(r.get(), "Mcu", 1), nullptr);
-}
-
-TEST(Stats, AffixesMatchWholeNamesButNeverLongerOnes) {
-  Record r = record({{"Mcu", 1, 1}, {"DecodeMcu", 2, 1}});
-  EXPECT_EQ(get_method_num_of_postfix(r.get(), "Mcu"), 2);
-  EXPECT_EQ(get_method_num_of_postfix(r.get(), "xDecodeMcu"), 0);
-  EXPECT_EQ(get_method_num_of_prefix(r.get(), "Mcux"), 0);
+  EXPECT_EQ(get_method_num_of_postfix(r.get(), "xVETAJ_DecodeMcu"), 0);
   const std::string huge(2000, 'u');  // longer than any scratch space
   EXPECT_EQ(get_method_num_of_postfix(r.get(), huge.c_str()), 0);
-  EXPECT_EQ(get_method_num_of_prefix(r.get(), huge.c_str()), 0);
-  EXPECT_EQ(get_method_num_of_postfix(r.get(), nullptr), 0);
 }
 
 TEST(Stats, UnterminatedNamesAndOversizedCountsStayInsideTheRecord) {
@@ -168,19 +113,10 @@ TEST(Stats, UnterminatedNamesAndOversizedCountsStayInsideTheRecord) {
   const std::string full(JPEG_STAT_NAME_SIZE, 'z');
   EXPECT_EQ(get_method_num_of_postfix(r, full.c_str()), JPEG_STAT_MAX_ENTRIES);
   EXPECT_EQ(get_method_num_of_prefix(r, (full + "z").c_str()), 0);
-  EXPECT_EQ(get_method_time(r, full.c_str()), r->entries[0].time);
   EXPECT_EQ(jpeg_get_index(r, "new"), -1);
   jpeg_stat_sort(r);
   jpeg_print_veta_info(r);
   std::free(r);
-}
-
-TEST(Stats, ReverseStringInPlace) {
-  for (const char* s : {"", "a", "ab", "abc", "abcd"}) {
-    std::string v = s, want(v.rbegin(), v.rend());
-    EXPECT_EQ(reverse_string(v.data()), v.data());
-    EXPECT_EQ(v, want);
-  }
 }
 
 TEST(Stats, ReportVisitsCalledMethodsInReportOrderWithTheTotal) {
@@ -194,17 +130,8 @@ TEST(Stats, ReportVisitsCalledMethodsInReportOrderWithTheTotal) {
   };
   EXPECT_EQ(vj::stats::visit_report(r.get(), collect, &lines), 2);
   ASSERT_EQ(lines.size(), 2u);
-  EXPECT_STREQ(lines[0].name, "KOLVAVETA_DecodeJPEG");
   EXPECT_STREQ(lines[1].name, "VETAJ_DoIdct8By8");
-  EXPECT_EQ(lines[1].call_times, 3);
-  EXPECT_EQ(lines[1].total_time, 100);
-  EXPECT_EQ(vj::stats::visit_report(record().get(), collect, &lines), 0);
-  // Every name of the report list once; nothing past its end.
-  std::vector<std::string> names;
-  for (int i = 0; i < vj::stats::kReportNameCount; ++i) names.push_back(vj::stats::report_name(i));
-  std::sort(names.begin(), names.end());
-  EXPECT_EQ(std::unique(names.begin(), names.end()), names.end());
-  EXPECT_EQ(vj::stats::report_name(vj::stats::kReportNameCount), nullptr);
+  EXPECT_EQ(std::make_pair(lines[1].call_times, lines[1].total_time), std::make_pair(3, 100));
 }
 
 }  // namespace
