@@ -204,9 +204,9 @@ INSTANTIATE_TEST_SUITE_P(Corpus, BaselineCoefficients, ::testing::ValuesIn(basel
 // ---------------------------------------------------------------------------
 // Restart markers and damaged data
 
-// Offset of the first entropy byte, of the 0xFF of each RST marker and of EOI.
+// Offset of the first entropy byte and of the 0xFF of each RST marker.
 struct EntropyLayout {
-  size_t start = 0, eoi = 0;
+  size_t start = 0;
   std::vector<size_t> rst;
 };
 
@@ -217,10 +217,8 @@ EntropyLayout layout_of(const Bytes& j) {
     if (j[i + 1] == 0xDA) l.start = next;
     i = next;
   }
-  for (size_t i = l.start; i + 1 < j.size() && l.start != 0 && l.eoi == 0; ++i) {
+  for (size_t i = l.start; i + 1 < j.size() && l.start != 0; ++i)
     if (j[i] == 0xFF && j[i + 1] >= 0xD0 && j[i + 1] <= 0xD7) l.rst.push_back(i);
-    if (j[i] == 0xFF && j[i + 1] == 0xD9) l.eoi = i;
-  }
   return l;
 }
 
@@ -247,7 +245,8 @@ TEST(RestartMarkers, MissingMarkerSkipsOneIntervalAndResynchronises) {
   const auto good = decode_all(jpeg);
   ASSERT_EQ(good.size(), probe.total_mcus());
   // Without RST1: intervals 0 and 1 decode, interval 2 reads zero bits (its
-  // first MCU from zeros, the rest untouched), decoding resumes at RST2.
+  // first MCU from zeros, the rest untouched, still counting down to the
+  // next restart), decoding resumes at RST2.
   auto broken = jpeg;
   broken.erase(broken.begin() + long(l.rst[1]), broken.begin() + long(l.rst[1]) + 2);
   const auto got = decode_all(broken);
@@ -290,25 +289,6 @@ struct RawInput {
   }
 };
 
-TEST(RestartMarkers, RestartSearchCountsDiscardedBytes) {
-  // Ten data bytes and one stuffed 0xFF 0x00 before RST0: 12 discarded, plus
-  // the 2 whole bytes left in the bit buffer.
-  RawInput in({1, 2, 3, 4, 5, 0xFF, 0x00, 6, 7, 8, 9, 10, 0xFF, 0xD0, 0x55});
-  in.d.restart_interval = 4;
-  in.d.comps_in_scan = 2;
-  in.e.bits_left = 17;
-  in.e.last_dc[0] = 5;
-  in.e.last_dc[1] = 6;
-  in.e.insufficient = 1;
-  ASSERT_EQ(VETAJ_ProcessRestartMarker(&in.d), 1);
-  EXPECT_EQ(in.m.discarded, 12u + 2u);
-  EXPECT_EQ(in.m.next_restart, 1);
-  EXPECT_EQ(in.e.last_dc[0] | in.e.last_dc[1] | in.e.insufficient, 0);
-  EXPECT_EQ(in.e.restarts_to_go, 4u);
-  EXPECT_EQ(in.w.remaining, 1u);                    // cursor right after the marker
-  EXPECT_EQ(VETAJ_ProcessRestartMarker(&in.d), 0);  // end of input while searching
-}
-
 TEST(BitReader, StuffingMarkersAndZeroFill) {
   // 0xFF 0x00 and 0xFF 0xFF 0x00 are data bytes 0xFF; EOI stops the data.
   RawInput in({0xFF, 0x00, 0xFF, 0xFF, 0x00, 0x81, 0xFF, 0xD9});
@@ -323,34 +303,6 @@ TEST(BitReader, StuffingMarkersAndZeroFill) {
   EXPECT_EQ(ws.bits_left, 25);
   EXPECT_EQ(ws.buffer & 0x1FFFFFF, 0xFFFF81u << 1);
   EXPECT_EQ(in.e.insufficient, 1);
-}
-
-// Data cut by EOI: once the decoder has run out, every MCU decodes to zero
-// blocks and still counts down to the next restart.
-TEST(BaselineDecoding, DataCutByEoiReadsZeroBitsWithTheFlagSet) {
-  const auto jpeg = vjtest::read_fixture("sample.jpg");
-  const auto l = layout_of(jpeg);
-  ASSERT_GT(l.eoi, l.start);
-  Bytes cut(jpeg.begin(), jpeg.begin() + long((l.start + l.eoi) / 2));
-  if (cut.back() == 0xFF) cut.pop_back();
-  cut.insert(cut.end(), {0xFF, 0xD9});
-  vjtest::ScanHarness h;
-  ASSERT_TRUE(h.open(cut));
-  uint32_t m = 0;
-  for (; m < h.total_mcus() && h.d()->entropy->insufficient == 0; ++m) {
-    h.at(m);
-    ASSERT_EQ(VETAJ_DecodeMcu(h.d(), h.blocks()), 1);
-  }
-  EXPECT_LT(m, h.total_mcus());
-  EXPECT_EQ(h.d()->unread_marker, 0xD9u);
-  for (; m < h.total_mcus(); ++m) {
-    h.at(m);
-    h.d()->entropy->restarts_to_go = 9;
-    ASSERT_EQ(VETAJ_DecodeMcu(h.d(), h.blocks()), 1);
-    EXPECT_EQ(h.d()->entropy->restarts_to_go, 8u);
-    for (int i = 0; i < 64 * h.d()->blocks_in_mcu; ++i)
-      ASSERT_EQ(h.blocks()[0][i], 0) << "MCU " << m;
-  }
 }
 
 using McuDecoder = int32_t (*)(DecoderInfo*, int16_t**);
