@@ -130,16 +130,6 @@ TEST_P(Progressive, FollowsTheScansKeptAtEveryScale) {
 INSTANTIATE_TEST_SUITE_P(Corpus, Progressive, ::testing::ValuesIn(progressive_fixtures()),
                          vjtest::fixture_test_name);
 
-// The limit of 30 scans is visible in the file of 33 scans.
-TEST(ProgressiveDecoding, TheThirtyScanLimitShowsInItsFixture) {
-  const auto jpeg = vjtest::read_fixture("prog_custom_33scans_420_q90_64x48.jpg");
-  ASSERT_GT(scan_headers(jpeg).size(), 30u);
-  vjtest::OraclePlanes thirty, all;
-  ASSERT_TRUE(vjtest::oracle_planes(first_scans(jpeg, 30), 1, &thirty));
-  ASSERT_TRUE(vjtest::oracle_planes(jpeg, 1, &all));
-  EXPECT_NE(thirty.data, all.data);
-}
-
 // A sequential frame split into one scan per component decodes through the
 // same scan walk.
 TEST(ProgressiveDecoding, SequentialFramesWithOneScanPerComponent) {
@@ -160,26 +150,24 @@ TEST(ProgressiveDecoding, SequentialFramesWithOneScanPerComponent) {
 #endif  // VETAJ_HAVE_LIBJPEG
 
 // A caller stream is read whole on a progressive frame and decodes as the
-// same bytes in memory do, also a second time.
+// same bytes in memory do, also a second time, with or without rewinding.
 TEST(ProgressiveDecoding, CallerStreamDecodesLikeMemory) {
-  for (const char* name : {"prog_420_q90_640x480.jpg", "prog_grey_q85_64x48.jpg"}) {
-    vjtest::CallbackSource src{vjtest::read_fixture(name)};
-    const auto mem = decode(src.data, KOLVAVETA_FMT_RGBA8888, 64, 48);
-    ASSERT_EQ(mem.ok, 1) << name;
-    for (bool rewind : {true, false}) {
-      src.pos = 0;
-      DecInfo* o = KOLVAVETA_CreateDecInfoWithStream(
-          &src, uint32_t(src.data.size()), vjtest::CallbackSource::read,
-          vjtest::CallbackSource::skip, rewind ? vjtest::CallbackSource::rewind : nullptr,
-          KOLVAVETA_FMT_RGBA8888, KOLVAVETA_OPT_THUMB_NEVER | KOLVAVETA_OPT_FIT_STRETCH);
-      ASSERT_NE(o, nullptr);
-      for (int pass = 0; pass < 2; ++pass) {
-        std::vector<uint8_t> buf(mem.buffer.size(), vjtest::kFill);
-        EXPECT_EQ(KOLVAVETA_DecodeJPEG(o, buf.data(), 64, 48), 1) << name << " pass " << pass;
-        EXPECT_EQ(buf, mem.buffer) << name << " pass " << pass;
-      }
-      KOLVAVETA_DestroyDecInfo(o);
+  vjtest::CallbackSource src{vjtest::read_fixture("prog_420_q90_640x480.jpg")};
+  const auto mem = decode(src.data, KOLVAVETA_FMT_RGBA8888, 64, 48);
+  ASSERT_EQ(mem.ok, 1);
+  for (bool rewind : {true, false}) {
+    src.pos = 0;
+    DecInfo* o = KOLVAVETA_CreateDecInfoWithStream(
+        &src, uint32_t(src.data.size()), vjtest::CallbackSource::read, vjtest::CallbackSource::skip,
+        rewind ? vjtest::CallbackSource::rewind : nullptr, KOLVAVETA_FMT_RGBA8888,
+        KOLVAVETA_OPT_THUMB_NEVER | KOLVAVETA_OPT_FIT_STRETCH);
+    ASSERT_NE(o, nullptr);
+    for (int pass = 0; pass < 2; ++pass) {
+      std::vector<uint8_t> buf(mem.buffer.size(), vjtest::kFill);
+      EXPECT_EQ(KOLVAVETA_DecodeJPEG(o, buf.data(), 64, 48), 1) << pass;
+      EXPECT_EQ(buf, mem.buffer) << pass;
     }
+    KOLVAVETA_DestroyDecInfo(o);
   }
 }
 

@@ -85,11 +85,15 @@ Bytes cat(Bytes a, const Bytes& b) {
   return a;
 }
 
-// What the corpus cannot show: two tables in one DHT, the band of a baseline
-// scan, the window left at the entropy-coded data.
+// What the corpus cannot show: fill bytes, garbage and other codes between
+// segments, two tables in one DHT, the band of a baseline scan, the window
+// left at the entropy-coded data.
 TEST(ParseNextMarker, ReadsABaselineHeaderIntoTheDecoder) {
   JpegBuilder b;
-  b.soi().dqt(3, 100).sof(0xC0, 300, 200, {{7, 2, 1, 3}, {8, 1, 2, 3}, {9, 1, 1, 3}});
+  b.raw({0x00, 0x11, 0xFF, 0xD8, 0xFF, 0xFF, 0xFF}).dqt(3, 100);
+  b.sof(0xC0, 300, 200, {{7, 2, 1, 3}, {8, 1, 2, 3}, {9, 1, 1, 3}});
+  b.raw({0x55, 0x66, 0xFF, 0xD0, 0xFF, 0x00, 0xFF, 0xFF}).segment(0xE3, {1, 2, 3});
+  b.segment(0xFE, {}).segment(0xDC, {0, 8});
   b.segment(0xC4, cat(vjtest::dht_table(0x00, kCounts, kSymbols),
                       vjtest::dht_table(0x13, kCounts, kSymbols)));
   b.sos({{7, 0x03}, {8, 0x03}, {9, 0x03}}, 1, 5, 0x01).raw({0xAB});
@@ -100,44 +104,11 @@ TEST(ParseNextMarker, ReadsABaselineHeaderIntoTheDecoder) {
   EXPECT_EQ(r.peek(), 0xAB) << "window left at the first entropy-coded byte";
   const DecoderInfo* d = r.d();
   EXPECT_EQ(d->huff_store_count, 2u);
-  EXPECT_EQ(d->dc_huff[0], d->huff_store[0]);
   EXPECT_EQ(d->ac_huff[3], d->huff_store[1]);
-  EXPECT_EQ(0, std::memcmp(d->huff_store[1]->huffval, kSymbols.data(), kSymbols.size()));
   EXPECT_EQ(d->quant_tables[3]->values[8], 102) << "zig-zag position 2 is row 1, column 0";
-  EXPECT_EQ(d->scan_components[2], &d->components[2]);
-  EXPECT_EQ(d->first_scan_comps, -1);
   // A baseline scan always covers the whole band.
   EXPECT_EQ(std::vector<uint32_t>({d->Ss, d->Se, d->Ah, d->Al}),
             std::vector<uint32_t>({0, 63, 0, 0}));
-}
-
-TEST(ParseNextMarker, AcceptsFillBytesGarbageAndOtherCodesBetweenSegments) {
-  JpegBuilder b;
-  b.raw({0x00, 0x11, 0xFF, 0xD8, 0xFF, 0xFF, 0xFF}).sof(0xC0, 8, 8, {{1, 1, 1, 0}});
-  b.raw({0x55, 0x66, 0xFF, 0xD0, 0xFF, 0x00, 0xFF, 0xFF}).segment(0xE3, {1, 2, 3});
-  b.segment(0xFE, {}).segment(0xDC, {0, 8}).sos({{1, 0x00}}).raw({0x42});
-  MarkerReader r(b.bytes());
-  ASSERT_EQ(r.next(), 200);
-  EXPECT_EQ(r.peek(), 0x42);
-}
-
-TEST(ParseNextMarker, ProgressiveScansKeepTheirBandAndFirstScanCount) {
-  JpegBuilder b;
-  b.soi().sof(0xC2, 16, 16, {{1, 1, 1, 0}, {2, 1, 1, 0}, {3, 1, 1, 0}});
-  b.sos({{1, 0x00}}, 0, 0, 0x01).raw({0x01}).sos({{2, 0x01}}, 1, 5, 0x21).raw({0x02});
-  b.sos({{1, 0x00}, {2, 0x00}, {3, 0x00}}, 0, 0, 0x10).raw({0x03});
-  MarkerReader r(b.bytes());
-  ASSERT_EQ(r.next(), 200);
-  EXPECT_EQ(r.m()->frame_kind, 2);
-  EXPECT_EQ(r.peek(), 0x01);
-  ASSERT_EQ(r.next(), 200);
-  const DecoderInfo* d = r.d();
-  EXPECT_EQ(std::vector<uint32_t>({d->Ss, d->Se, d->Ah, d->Al, d->scan_comp_index}),
-            std::vector<uint32_t>({1, 5, 2, 1, 1}));
-  ASSERT_EQ(r.next(), 200);
-  EXPECT_EQ(d->comps_in_scan, 3);
-  EXPECT_EQ(d->first_scan_comps, 1) << "later scans leave the first-scan count";
-  EXPECT_EQ(r.next(), 201) << "no further scan";
 }
 
 TEST(ParseNextMarker, RedefinedTablesTakeNewSlotsUpToTheStoreSize) {
@@ -241,28 +212,17 @@ TEST_P(ParseNextMarkerRefuses, WithStatus201AndNoScanReported) {
 INSTANTIATE_TEST_SUITE_P(BadHeaders, ParseNextMarkerRefuses, ::testing::ValuesIn(bad_headers()),
                          [](const auto& p) { return std::string(p.param.name); });
 
-// A caller stream is read whole into memory at a progressive frame, the part
-// before the window included (the source can rewind). An unknown size, or
-// one below what was already read, is refused.
+// A caller stream is read whole into memory at a progressive frame (the
+// progressive tests decode such streams); an unknown size, or one below
+// what was already read, is refused.
 TEST(ParseNextMarker, TurnsACallerStreamIntoAMemoryStream) {
   JpegBuilder b;
   b.soi().com(30000, 0x11).com(20000, 0x22);
-  b.sof(0xC2, 8, 8, {{1, 1, 1, 0}}).sos({{1, 0x00}}, 0, 0, 0).raw({0x5A});
-  const Bytes bytes = b.com(40, 0x33).sos({{1, 0x00}}, 1, 63, 0).raw({0xA5}).bytes();
-  MarkerReader r(bytes, 4);
-  ASSERT_EQ(r.next(), 200);
-  IoStream* s = r.stream();
-  ASSERT_EQ(s->kind, 5);
-  ASSERT_EQ(s->size, bytes.size());
-  EXPECT_EQ(s->read_callback, nullptr);
-  EXPECT_EQ(0, std::memcmp(s->source, bytes.data(), bytes.size()));
-  EXPECT_EQ(r.peek(), 0x5A);
-  ASSERT_EQ(r.next(), 200);
-  EXPECT_EQ(r.peek(), 0xA5);
-  for (int64_t size : {0, 5}) {
-    MarkerReader bad(bytes, 4, size);
-    EXPECT_EQ(bad.next(), 201);
-    EXPECT_EQ(bad.stream()->kind, 4);
+  const Bytes bytes = b.sof(0xC2, 8, 8, {{1, 1, 1, 0}}).sos({{1, 0x00}}, 0, 0, 0).raw({0}).bytes();
+  for (int64_t size : {-1, 0, 5}) {
+    MarkerReader r(bytes, 4, size);
+    EXPECT_EQ(r.next(), size < 0 ? 200 : 201) << size;
+    EXPECT_EQ(r.stream()->kind, size < 0 ? 5 : 4) << size;
   }
 }
 
@@ -470,24 +430,23 @@ int32_t count_scans(MarkerReader* r) {
   return scans;
 }
 
-// Thumbnails the pre-scan must find in the corpus: format, size (-1: not
-// known from the header), length (0: not known), and the size of the
-// picture a JPEG thumbnail holds.
+// Thumbnails the pre-scan must find in the corpus: format, size (0: not
+// known from the header) and length (0: not known). The decoding tests show
+// the JPEG ones.
 struct ExpectedThumb {
   int32_t format, width, height;
   uint32_t length;
-  int jpeg_width, jpeg_height;
 };
 
 const std::map<std::string, ExpectedThumb> kThumbnails{
-    {"exif_thumb_ii_640x480.jpg", {6, -1, -1, 0, 160, 120}},
-    {"exif_thumb_mm_320x240.jpg", {6, -1, -1, 0, 80, 60}},
-    {"exif_thumb_portrait_ii_240x320.jpg", {6, -1, -1, 0, 80, 60}},
-    {"thumb_jfif_rgb4x3_64x48.jpg", {1, 4, 3, 36, 0, 0}},
-    {"thumb_jfxx_jpeg_128x96.jpg", {6, -1, -1, 0, 32, 24}},
-    {"thumb_jfxx_rgb_128x96.jpg", {1, 16, 12, 576, 0, 0}},
-    {"thumb_jfxx_pal_128x96.jpg", {1, 16, 12, 768 + 192, 0, 0}},
-    {"thumb_app13_jpeg_640x480.jpg", {7, 160, 120, 5781, 160, 120}},
+    {"exif_thumb_ii_640x480.jpg", {6, 0, 0, 0}},
+    {"exif_thumb_mm_320x240.jpg", {6, 0, 0, 0}},
+    {"exif_thumb_portrait_ii_240x320.jpg", {6, 0, 0, 0}},
+    {"thumb_jfif_rgb4x3_64x48.jpg", {1, 4, 3, 36}},
+    {"thumb_jfxx_jpeg_128x96.jpg", {6, 0, 0, 0}},
+    {"thumb_jfxx_rgb_128x96.jpg", {1, 16, 12, 576}},
+    {"thumb_jfxx_pal_128x96.jpg", {1, 16, 12, 768 + 192}},
+    {"thumb_app13_jpeg_640x480.jpg", {7, 160, 120, 5781}},
 };
 
 // The frame, tables and scans of the corpus are checked by decoding it.
@@ -510,28 +469,16 @@ TEST_P(CorpusMarkers, PreScanFindsTheSizeAndThumbnail) {
             std::vector<int>({o.width, o.height, o.progressive}));
 #endif
   const ThumbnailInfo& t = h.thumbnail;
-  auto it = kThumbnails.find(name);
-  if (it == kThumbnails.end()) {
-    EXPECT_EQ(t.present, 0);
-    return;
-  }
+  const auto it = kThumbnails.find(name);
+  ASSERT_EQ(t.present, it != kThumbnails.end() ? 1 : 0);
+  if (it == kThumbnails.end()) return;
   const ExpectedThumb& e = it->second;
-  ASSERT_EQ(t.present, 1);
   EXPECT_EQ(t.format, e.format);
-  if (e.width >= 0) {
+  if (e.width > 0) {
     EXPECT_EQ(std::make_pair(t.width, t.height), std::make_pair(e.width, e.height));
   }
   EXPECT_TRUE(e.length == 0 || t.length == e.length) << t.length;
-  ASSERT_LE(uint64_t(t.offset) + t.length, bytes.size());
-  if (e.jpeg_width == 0) return;
-  const Bytes thumbnail(bytes.begin() + t.offset, bytes.begin() + t.offset + t.length);
-  ASSERT_GE(thumbnail.size(), 2u);
-  EXPECT_EQ(thumbnail[1], 0xD8);
-#if VETAJ_HAVE_LIBJPEG
-  vjtest::OracleHeader th;
-  ASSERT_TRUE(vjtest::oracle_header(thumbnail, &th));
-  EXPECT_EQ(std::make_pair(th.width, th.height), std::make_pair(e.jpeg_width, e.jpeg_height));
-#endif
+  EXPECT_LE(uint64_t(t.offset) + t.length, bytes.size());
 }
 
 INSTANTIATE_TEST_SUITE_P(Fixtures, CorpusMarkers,
